@@ -17,6 +17,13 @@
 
 #include "xavocore.h"
 
+/* The operations never throw; C++ callers may rely on it. */
+#if defined(__cplusplus)
+#define XAVOPRINTER_NOEXCEPT noexcept
+#else
+#define XAVOPRINTER_NOEXCEPT
+#endif
+
 #ifdef __cplusplus
 extern "C" {
 #endif
@@ -129,76 +136,76 @@ XAVO_STATIC_ASSERT(offsetof(PrinterGoogleInfo, szPassword) == 255, "szPassword o
 XAVO_STATIC_ASSERT(offsetof(PrinterGoogleInfo, szRefreshToken) == 383, "szRefreshToken offset");
 
 /* ---- printer configuration and lock ---- */
-int32_t XAVOPrinterPrinterConfLock(void);
-int32_t XAVOPrinterPrinterConfUnlock(int32_t fdLock);
-int32_t XAVOPrinterConfSetup(const UsbPrinterConf *pPrinterConf, int32_t blWriteEmpty);
-int32_t XAVOPrinterCupsNameGet(const char *szPrinterId, char *szBuf, int32_t cbBuf);
+int32_t XAVOPrinterPrinterConfLock(void) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterPrinterConfUnlock(int32_t fdLock) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterConfSetup(const UsbPrinterConf *pPrinterConf, int32_t blWriteEmpty) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterCupsNameGet(const char *szPrinterId, char *szBuf, int32_t cbBuf) XAVOPRINTER_NOEXCEPT;
 
 /* ---- device ID strings ----
  * The device ID string is writable: the appliance's callers hand in their own
  * buffers, and the contract allows the search to mark its place in it. */
-int32_t XAVOPrinterConfStringIdParse(char *szStringId, const char *szType, char *szBuf, int32_t cbBuf);
-int32_t XAVOPrinterConfStringIdGetVendor(char *szStringId, char *szBuf, int32_t cbBuf);
-int32_t XAVOPrinterConfStringIdGetModel(char *szStringId, char *szBuf, int32_t cbBuf);
-int32_t XAVOPrinterConfStringIdGetCmd(char *szStringId, char *szBuf, int32_t cbBuf);
-int32_t XAVOPrinterModelDetect(UsbPrinterConf *pPrinterConf);
+int32_t XAVOPrinterConfStringIdParse(char *szStringId, const char *szType, char *szBuf, int32_t cbBuf) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterConfStringIdGetVendor(char *szStringId, char *szBuf, int32_t cbBuf) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterConfStringIdGetModel(char *szStringId, char *szBuf, int32_t cbBuf) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterConfStringIdGetCmd(char *szStringId, char *szBuf, int32_t cbBuf) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterModelDetect(UsbPrinterConf *pPrinterConf) XAVOPRINTER_NOEXCEPT;
 
 /* ---- USB device access ---- */
-int32_t XAVOPrinterDevOpen(const char *szDevName, int32_t nRetry);
-int32_t XAVOPrinterGetStringId(const char *szDevName, char *szBuf, int32_t cbBuf);
-int32_t XAVOResetPrinter(const char *szDevName);
+int32_t XAVOPrinterDevOpen(const char *szDevName, int32_t nRetry) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterGetStringId(const char *szDevName, char *szBuf, int32_t cbBuf) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOResetPrinter(const char *szDevName) XAVOPRINTER_NOEXCEPT;
 
 /* ---- USB printer listing and counting ---- */
-int32_t XAVOPrinterUsbtabEnum(char ***pppszDevNames, int32_t *piCount);
-int32_t XAVOPrinterProcUsbtabIdEnum(ORLICSzList **ppList);
-int32_t XAVOPrinterEnumCount(int32_t iType, ORLICSzList **ppList);
+int32_t XAVOPrinterUsbtabEnum(char ***pppszDevNames, int32_t *piCount) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterProcUsbtabIdEnum(ORLICSzList **ppList) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterEnumCount(int32_t iType, ORLICSzList **ppList) XAVOPRINTER_NOEXCEPT;
 
 /* ---- USB enable and disable ---- */
-int32_t XAVOPrinterEnableExt(int32_t action, const char *szDevName, const char *szBusId);
+int32_t XAVOPrinterEnableExt(int32_t action, const char *szDevName, const char *szBusId) XAVOPRINTER_NOEXCEPT;
 
 /* ---- network printer table and records ---- */
-int32_t XAVOPrinterNetUpdateConf(int32_t iAction, const NetPrinterConf *pNPConf);
-int32_t XAVOPrinterNetNptabEnum(ORLICSzList **ppList);
-int32_t XAVOPrinterNetConfSetup(const NetPrinterConf *pNPConf, int32_t blWriteEmpty);
+int32_t XAVOPrinterNetUpdateConf(int32_t iAction, const NetPrinterConf *pNPConf) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterNetNptabEnum(ORLICSzList **ppList) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterNetConfSetup(const NetPrinterConf *pNPConf, int32_t blWriteEmpty) XAVOPRINTER_NOEXCEPT;
 
 /* ---- network identification and reachability ---- */
-int32_t XAVOPrinterNetGetStringId(const char *szIP, char *szOutBuf, int32_t iOutSize);
+int32_t XAVOPrinterNetGetStringId(const char *szIP, char *szOutBuf, int32_t iOutSize) XAVOPRINTER_NOEXCEPT;
 int32_t XAVOPrinterNetGetStringBackend(const char *szIP, char *szBackend, uint32_t cbBackend,
-                                       char *szQName, uint32_t cbQName);
-int32_t XAVOPrinterNetInfoGetByIP(const char *szIP, NetPrinterInfo *pNPInfo);
-int32_t XAVOPrinterNetAvahiInfoGet(const char *szIP, NetPrinterInfo *pNPInfo);
-int32_t XAVOPrinterNetBjnpInfoGet(const char *szIP, NetPrinterInfo *pNPInfo);
-int32_t XAVOPrinterNetPingStatus(const char *szIP, char *szStatus, int32_t cbStatus);
+                                       char *szQName, uint32_t cbQName) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterNetInfoGetByIP(const char *szIP, NetPrinterInfo *pNPInfo) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterNetAvahiInfoGet(const char *szIP, NetPrinterInfo *pNPInfo) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterNetBjnpInfoGet(const char *szIP, NetPrinterInfo *pNPInfo) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterNetPingStatus(const char *szIP, char *szStatus, int32_t cbStatus) XAVOPRINTER_NOEXCEPT;
 
 /* ---- CUPS queues ---- */
-int32_t XAVOPrinterCupsAdd(const char *szPrinterId, const char *szPpdFile);
-int32_t XAVOPrinterCupsPrinterEnable(const char *szCupsPrinterName, int32_t blEnable);
-int32_t XAVOPrinterCupsNameCheck(const char *szPrinterId, const char *szCupsPrinterName);
-int32_t XAVOPrinterNetCupsAdd(const NetPrinterConf *pNPConf, const char *szPpdFile);
+int32_t XAVOPrinterCupsAdd(const char *szPrinterId, const char *szPpdFile) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterCupsPrinterEnable(const char *szCupsPrinterName, int32_t blEnable) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterCupsNameCheck(const char *szPrinterId, const char *szCupsPrinterName) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterNetCupsAdd(const NetPrinterConf *pNPConf, const char *szPpdFile) XAVOPRINTER_NOEXCEPT;
 /* Returns a heap text that the caller releases with free(), or NULL. */
-char *XAVOCupsGetPPD(const char *szPpdName);
-int32_t XAVOPrinterCupsRm(const char *szPrinterId);
-int32_t XAVOPrinterCupsRmByName(const char *szCupsPrinterName);
-int32_t XAVOPrinterNetCupsRm(const char *szPrinterId);
-int32_t XAVOPrinterCupsUsbConfRmAll(void);
-int32_t XAVOPrinterNetIPCheck(const char *szIP);
-int32_t XAVOPrinterNetCupsNameAndIPCheck(const char *szIP, const char *szCupsPrinterName);
+char *XAVOCupsGetPPD(const char *szPpdName) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterCupsRm(const char *szPrinterId) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterCupsRmByName(const char *szCupsPrinterName) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterNetCupsRm(const char *szPrinterId) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterCupsUsbConfRmAll(void) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterNetIPCheck(const char *szIP) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterNetCupsNameAndIPCheck(const char *szIP, const char *szCupsPrinterName) XAVOPRINTER_NOEXCEPT;
 
 /* ---- printing and jobs ---- */
 int32_t XAVOPrinterCupsPrintFile(const char *szPrinterId, const char *szFile, const char *szTitle,
-                                 int32_t blRemove);
-int32_t XAVOPrinterCupsPrintTestPage(const char *szPrinterId);
-int32_t XAVOPrinterCupsJobWaitComplete(const char *szPrinterId, const char *szJobId);
-int32_t XAVOPrinterQueueGet(const char *szPrinterId, char *szBuf, int32_t cbBuf);
-int32_t XAVOPrinterCleanSpool(void);
+                                 int32_t blRemove) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterCupsPrintTestPage(const char *szPrinterId) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterCupsJobWaitComplete(const char *szPrinterId, const char *szJobId) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterQueueGet(const char *szPrinterId, char *szBuf, int32_t cbBuf) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterCleanSpool(void) XAVOPRINTER_NOEXCEPT;
 
 /* ---- sharing services ---- */
-int32_t XAVOPrinterIsActive(void);
-int32_t XAVOPrinterGoogleInfoGet(PrinterGoogleInfo *pInfo);
-int32_t XAVOPrinterGoogleInfoSet(const PrinterGoogleInfo *pInfo);
-int32_t XAVOPrinterUsbipEject(const char *szPrinterId);
-int32_t XAVOPrinterUsbipGetLockStatus(const char *szPrinterId, char *szBuf, int32_t cbBuf);
-int32_t XAVOPrinterUsbipLockRelease(const char *szPrinterId);
+int32_t XAVOPrinterIsActive(void) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterGoogleInfoGet(PrinterGoogleInfo *pInfo) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterGoogleInfoSet(const PrinterGoogleInfo *pInfo) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterUsbipEject(const char *szPrinterId) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterUsbipGetLockStatus(const char *szPrinterId, char *szBuf, int32_t cbBuf) XAVOPRINTER_NOEXCEPT;
+int32_t XAVOPrinterUsbipLockRelease(const char *szPrinterId) XAVOPRINTER_NOEXCEPT;
 
 #ifdef __cplusplus
 }
