@@ -1,0 +1,42 @@
+#include <syslog.h>
+
+#include <cstdio>
+
+#include "cups/queue_create.h"
+#include "internal/log.h"
+#include "xavoprinter.h"
+
+namespace {
+constexpr char kUnit[] = "printer_backup_ppd";
+constexpr char kLogMkdirFailed[] = "%s:%d mkdir -p %s failed";
+constexpr char kLogCopyFailed[] = "%s:%d cp -f %s %s failed";
+constexpr char kMkdirPath[] = "/bin/mkdir";
+constexpr char kCpPath[] = "/bin/cp";
+constexpr int kDestSize = 256;
+}  // namespace
+
+namespace xavo {
+
+int32_t PrinterBackupPpd(const char *szPpdFile, const char *szPrinterId) {
+    if (!XARG_OK(szPpdFile != nullptr, "((void *)0) != szPpdFile") ||
+        !XARG_OK(szPpdFile[0] != '\0', "0 != szPpdFile[0]") ||
+        !XARG_OK(szPrinterId != nullptr, "((void *)0) != szPrinterId") ||
+        !XARG_OK(szPrinterId[0] != '\0', "0 != szPrinterId[0]")) {
+        return -1;
+    }
+    if (ORLICExec(kMkdirPath, "-p", kPpdDir, nullptr, nullptr) != 0) {
+        XLOG(LOG_ERR, kLogMkdirFailed, kPpdDir);
+        XSETERR(ERR_EXEC);
+        return -1;
+    }
+    char szDest[kDestSize] = {};
+    std::snprintf(szDest, sizeof szDest, kPpdPathFormat, szPrinterId);
+    if (ORLICExec(kCpPath, "-f", szPpdFile, szDest, nullptr) != 0) {
+        XLOG(LOG_ERR, kLogCopyFailed, szPpdFile, szDest);
+        XSETERR(ERR_EXEC);
+        return -1;
+    }
+    return 0;
+}
+
+}  // namespace xavo
