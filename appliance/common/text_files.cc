@@ -1,0 +1,273 @@
+#include "common/text_files.h"
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstring>
+
+namespace xavo::platform {
+namespace {
+
+// The appliance's files are a few kilobytes; anything this large is not one
+// of them, and reading it whole would only exhaust a small appliance.
+constexpr off_t kMaxFileSize = 16 * 1024 * 1024;
+constexpr mode_t kNewFileMode = 0644;
+
+class OwnedFd {
+public:
+    explicit OwnedFd(int fd) : fd_(fd) {}
+    OwnedFd(const OwnedFd &) = delete;
+    OwnedFd &operator=(const OwnedFd &) = delete;
+    ~OwnedFd() {
+        if (fd_ >= 0) {
+            int saved = errno;
+            ::close(fd_);
+            errno = saved;
+        }
+    }
+    int get() const { return fd_; }
+    // Closes now and reports the result: a failed close of a written file
+    // can be the first sign of a lost write.
+    int Close() {
+        int fd = fd_;
+        fd_ = -1;
+        return ::close(fd);
+    }
+
+private:
+    int fd_;
+};
+
+// The temporary file of a replacement, removed unless it was renamed into
+// place.
+class TempFile {
+public:
+    explicit TempFile(std::string name) : name_(std::move(name)) {}
+    TempFile(const TempFile &) = delete;
+    TempFile &operator=(const TempFile &) = delete;
+    ~TempFile() {
+        if (!committed_) {
+            int saved = errno;
+            ::unlink(name_.c_str());
+            errno = saved;
+        }
+    }
+    const char *name() const { return name_.c_str(); }
+    void Commit() { committed_ = true; }
+
+private:
+    std::string name_;
+    bool committed_ = false;
+};
+
+bool WriteAll(int fd, std::string_view data) {
+    while (!data.empty()) {
+        ssize_t n = ::write(fd, data.data(), data.size());
+        if (n < 0) {
+            if (errno == EINTR) continue;
+            return false;
+        }
+        data.remove_prefix(static_cast<size_t>(n));
+    }
+    return true;
+}
+
+std::string DirName(const std::string &path) {
+    size_t slash = path.rfind('/');
+    if (slash == std::string::npos) return ".";
+    if (slash == 0) return "/";
+    return path.substr(0, slash);
+}
+
+std::string BaseName(const std::string &path) {
+    size_t slash = path.rfind('/');
+    return slash == std::string::npos ? path : path.substr(slash + 1);
+}
+
+bool IsBlank(char c) { return c == ' ' || c == '\t' || c == '\r' || c == '\n' || c == '\v' || c == '\f'; }
+
+}  // namespace
+
+ReadResult ReadTextFile(const char *szPath, std::string *pText) {
+    // O_NONBLOCK: a FIFO planted at the path must not hang the reader; it is
+    // refused below like any other non-regular file.
+    OwnedFd fd(::open(szPath, O_RDONLY | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
+    if (fd.get() < 0) return errno == ENOENT ? ReadResult::kMissing : ReadResult::kFailed;
+    struct stat st {};
+    if (::fstat(fd.get(), &st) != 0) return ReadResult::kFailed;
+    if (!S_ISREG(st.st_mode) || st.st_size > kMaxFileSize) {
+        errno = S_ISREG(st.st_mode) ? EFBIG : EINVAL;
+        return ReadResult::kFailed;
+    }
+    std::string text;
+    char chunk[8192];
+    for (;;) {
+        ssize_t n = ::read(fd.get(), chunk, sizeof chunk);
+        if (n < 0) {
+            if (errno == EINTR) continue;
+            return ReadResult::kFailed;
+        }
+        if (n == 0) break;
+        text.append(chunk, static_cast<size_t>(n));
+        if (text.size() > static_cast<size_t>(kMaxFileSize)) {
+            errno = EFBIG;
+            return ReadResult::kFailed;
+        }
+    }
+    *pText = std::move(text);
+    return ReadResult::kOk;
+}
+
+bool ReplaceFile(const char *szPath, std::string_view content, Failure *pFailure) {
+    const std::string path(szPath);
+    struct stat old {};
+    bool bExists = false;
+    if (::lstat(szPath, &old) == 0) {
+        // Refusing a symlink rather than replacing it: a link at one of
+        // these paths is either planted (in /tmp) or an administrator's
+        // deliberate arrangement, and neither should be silently broken or
+        // followed by a root process.  rename() below replaces whatever is
+        // at the path without following it, so a link planted after this
+        // check is replaced, never written through.
+        if (!S_ISREG(old.st_mode)) {
+            errno = S_ISLNK(old.st_mode) ? ELOOP : EINVAL;
+            *pFailure = {kErrOpen, __LINE__};
+            return false;
+        }
+        bExists = true;
+    } else if (errno != ENOENT) {
+        *pFailure = {kErrOpen, __LINE__};
+        return false;
+    }
+
+    // Same directory, so that the rename stays within one file system and
+    // is atomic; hidden, so that directory listings do not pick it up.
+    std::string tmpl = DirName(path) + "/." + BaseName(path) + ".XXXXXX";
+    OwnedFd fd(::mkostemp(tmpl.data(), O_CLOEXEC));
+    if (fd.get() < 0) {
+        *pFailure = {kErrOpen, __LINE__};
+        return false;
+    }
+    TempFile temp(tmpl);
+
+    if (!WriteAll(fd.get(), content)) {
+        *pFailure = {kErrWrite, __LINE__};
+        return false;
+    }
+    // mkstemp made the file 0600; the replacement takes the old file's
+    // mode (Samba and CUPS read some of these files as other users).
+    if (::fchmod(fd.get(), bExists ? (old.st_mode & 07777) : kNewFileMode) != 0) {
+        *pFailure = {kErrWrite, __LINE__};
+        return false;
+    }
+    if (bExists && (old.st_uid != ::geteuid() || old.st_gid != ::getegid()) &&
+        ::fchown(fd.get(), old.st_uid, old.st_gid) != 0 && errno != EPERM) {
+        *pFailure = {kErrWrite, __LINE__};
+        return false;
+    }
+    // The data must be on disk before the rename makes it the file, or a
+    // power cut could leave an empty file under the real name.
+    if (::fsync(fd.get()) != 0 || fd.Close() != 0) {
+        *pFailure = {kErrWrite, __LINE__};
+        return false;
+    }
+    if (::rename(temp.name(), szPath) != 0) {
+        *pFailure = {kErrRename, __LINE__};
+        return false;
+    }
+    temp.Commit();
+    // Make the rename itself durable; the new content is in place already,
+    // so a failure here is not reported.
+    OwnedFd dir(::open(DirName(path).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    if (dir.get() >= 0) ::fsync(dir.get());
+    return true;
+}
+
+std::string_view Trim(std::string_view text) {
+    while (!text.empty() && IsBlank(text.front())) text.remove_prefix(1);
+    while (!text.empty() && IsBlank(text.back())) text.remove_suffix(1);
+    return text;
+}
+
+bool IsControl(char c) {
+    auto u = static_cast<unsigned char>(c);
+    return u < 0x20 || u == 0x7f;
+}
+
+bool HasControl(std::string_view text) {
+    for (char c : text) {
+        if (IsControl(c)) return true;
+    }
+    return false;
+}
+
+std::vector<std::string> SplitLines(std::string_view text) {
+    std::vector<std::string> lines;
+    while (!text.empty()) {
+        size_t nl = text.find('\n');
+        size_t len = nl == std::string_view::npos ? text.size() : nl + 1;
+        lines.emplace_back(text.substr(0, len));
+        text.remove_prefix(len);
+    }
+    return lines;
+}
+
+std::optional<std::string_view> ParseSectionHeader(std::string_view line) {
+    line = Trim(line);
+    if (line.empty() || line.front() != '[') return std::nullopt;
+    size_t close = line.rfind(']');
+    if (close == std::string_view::npos || close == 0) return std::nullopt;
+    return line.substr(1, close - 1);
+}
+
+std::optional<KeyValue> ParseSectionKeyLine(std::string_view line) {
+    line = Trim(line);
+    if (line.empty() || line.front() == '#' || line.front() == ';' || line.front() == '[') return std::nullopt;
+    size_t eq = line.find('=');
+    if (eq == std::string_view::npos) return std::nullopt;
+    KeyValue kv{Trim(line.substr(0, eq)), Trim(line.substr(eq + 1))};
+    if (kv.key.empty()) return std::nullopt;
+    return kv;
+}
+
+std::optional<KeyValue> ParseKeyValueLine(std::string_view line) {
+    line = Trim(line);
+    if (line.empty() || line.front() == '#') return std::nullopt;
+    size_t eq = line.find('=');
+    if (eq == std::string_view::npos) return std::nullopt;
+    KeyValue kv{Trim(line.substr(0, eq)), Trim(line.substr(eq + 1))};
+    if (kv.key.empty()) return std::nullopt;
+    if (kv.value.size() >= 2 && kv.value.front() == '"' && kv.value.back() == '"') {
+        kv.value = kv.value.substr(1, kv.value.size() - 2);
+    }
+    return kv;
+}
+
+bool FormatLine(const char *szFormat, std::string_view key, std::string_view value, std::string *pLine) {
+    if (szFormat == nullptr) return false;
+    std::string line;
+    int nArgs = 0;
+    for (const char *p = szFormat; *p != '\0'; ++p) {
+        if (*p != '%') {
+            line.push_back(*p);
+            continue;
+        }
+        ++p;
+        if (*p == '%') {
+            line.push_back('%');
+        } else if (*p == 's' && nArgs < 2) {
+            line.append(nArgs == 0 ? key : value);
+            ++nArgs;
+        } else {
+            return false;
+        }
+    }
+    if (nArgs != 2) return false;
+    if (line.empty() || line.back() != '\n') line.push_back('\n');
+    *pLine = std::move(line);
+    return true;
+}
+
+}  // namespace xavo::platform

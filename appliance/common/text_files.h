@@ -1,0 +1,72 @@
+// The appliance's small text files: reading them whole, replacing them
+// atomically, and the pure line parsers of the two forms the platform
+// writes (section files and key="value" files).
+#pragma once
+
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "common/appliance.h"
+
+namespace xavo::platform {
+
+// ---- reading and replacing ------------------------------------------------
+
+enum class ReadResult { kOk, kMissing, kFailed };
+
+// Reads a whole regular file.  A symlink at the path is never followed (the
+// appliance keeps some of these files in /tmp, where anybody can plant one)
+// and neither is a FIFO or device opened for reading: both are kFailed.
+ReadResult ReadTextFile(const char *szPath, std::string *pText);
+
+// Replaces the file's content atomically: a temporary file in the same
+// directory is written, flushed to disk and renamed over the path, so that
+// a reader or a writer killed half way sees the old or the new content,
+// never a torn one.  An existing file keeps its mode and owner; a new one
+// gets 0644.  A symlink (or anything but a regular file) at the path is
+// refused, never written through.  On failure the file is unchanged and
+// *pFailure tells the code and line to report.
+bool ReplaceFile(const char *szPath, std::string_view content, Failure *pFailure);
+
+// ---- text ---------------------------------------------------------------
+
+std::string_view Trim(std::string_view text);
+bool IsControl(char c);
+bool HasControl(std::string_view text);
+
+// Splits text into lines, each keeping its newline; a last line without one
+// is kept as it is.
+std::vector<std::string> SplitLines(std::string_view text);
+
+struct KeyValue {
+    std::string_view key;
+    std::string_view value;
+};
+
+// ---- section files -------------------------------------------------------
+
+// The name of a section header line: the text between the first "[" and the
+// last "]" of the line, so that names holding brackets or "=" (printer IDs
+// are built from device serial numbers) read back as they were written.
+std::optional<std::string_view> ParseSectionHeader(std::string_view line);
+// A key line inside a section: key and value trimmed of white space, as
+// Samba reads them.  Blank lines, comments ("#", ";") and lines without "="
+// give nothing.
+std::optional<KeyValue> ParseSectionKeyLine(std::string_view line);
+
+// ---- key-value files -----------------------------------------------------
+
+// key="value": the value without its quotes (a value without quotes is
+// taken as it stands).  Blank lines and "#" comments give nothing.
+std::optional<KeyValue> ParseKeyValueLine(std::string_view line);
+
+// ---- line formats ----------------------------------------------------------
+
+// Expands a caller's line format holding exactly two "%s" (key, then value;
+// "%%" stands for "%") without handing the format to printf, and ends the
+// line with a newline if the format does not.  False for any other format.
+bool FormatLine(const char *szFormat, std::string_view key, std::string_view value, std::string *pLine);
+
+}  // namespace xavo::platform

@@ -1,0 +1,26 @@
+// Operations the core's units share among themselves, outside the exported
+// interface (and so not counted by the test controls).
+#pragma once
+
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "common/appliance.h"
+
+namespace xavo::core {
+
+// Closes every named lock this process holds (the test controls' reset).
+void ReleaseNamedLocks();
+
+// Runs a program with the given arguments (argv[0] first) and waits for it.
+// The result: the exit status (0 to 255), 128 + N when signal N killed it,
+// or -1 when it could not be started or waited for (*pFailure then says
+// where).
+int32_t RunAndWait(const char *szProgram, const std::vector<std::string> &argv, xavo::platform::Failure *pFailure);
+
+// True when a live (not zombie) process has the given name as its command
+// name (the kernel keeps the first 15 characters).
+bool ProcessAlive(std::string_view name);
+
+}  // namespace xavo::core

@@ -1,0 +1,167 @@
+// Key-value files: one key="value" line per entry, the form of the USB
+// printer table, the network printer table and the USB/IP status files.
+//
+// A key set twice reads as its last value, as a shell reading the file
+// would see it; setting a key leaves exactly one line for it.  Writing
+// changes only the key's line and replaces the file atomically.
+#include <algorithm>
+#include <cstring>
+#include <string>
+#include <vector>
+
+#include "common/text_files.h"
+#include "core/containers.h"
+
+using namespace xavo::platform;
+
+namespace {
+constexpr char kUnit[] = "keyvalue_file";
+
+// A key must read back as itself (see ParseKeyValueLine): no "=", no quote,
+// no white space at its ends, not a comment.
+bool KeyOk(const char *szKey) {
+    if (szKey == nullptr) return false;
+    std::string_view key(szKey);
+    return !key.empty() && !HasControl(key) && key.find_first_of("=\"") == std::string_view::npos &&
+           Trim(key) == key && key.front() != '#';
+}
+
+// Values are refused, not altered: they are device names, addresses and
+// status texts that mean nothing once changed, and a quote or a line break
+// would end the value early or forge a line of its own.
+bool ValueOk(const char *szValue) {
+    return szValue != nullptr && !HasControl(szValue) && std::strchr(szValue, '"') == nullptr;
+}
+
+bool Load(const char *szPath, bool bMissingIsEmpty, std::string *pText, int iLine) {
+    switch (ReadTextFile(szPath, pText)) {
+        case ReadResult::kOk:
+            return true;
+        case ReadResult::kMissing:
+            if (bMissingIsEmpty) {
+                pText->clear();
+                return true;
+            }
+            SetError(kErrOpen, kUnit, iLine);
+            return false;
+        case ReadResult::kFailed:
+            break;
+    }
+    SetError(kErrRead, kUnit, iLine);
+    return false;
+}
+
+bool Store(const char *szPath, const std::string &text) {
+    Failure failure;
+    if (ReplaceFile(szPath, text, &failure)) return true;
+    SetError(failure.code, kUnit, failure.line);
+    return false;
+}
+
+bool IsKeyLine(std::string_view line, std::string_view key) {
+    auto kv = ParseKeyValueLine(line);
+    return kv && kv->key == key;
+}
+
+}  // namespace
+
+XAVO_PLATFORM_API int32_t ORLICFileGetKeyValue(const char *szPath, const char *szKey, char *szBuf, int32_t cbBuf,
+                                               uint32_t /*uFlags: no flag is defined; callers pass 0*/) {
+    if (XAVO_INJECTED()) return -1;
+    if (szPath == nullptr || szKey == nullptr || szBuf == nullptr || cbBuf <= 0) {
+        SetError(kErrBadParameters, kUnit, __LINE__);
+        return -1;
+    }
+    return XAVO_GUARD(int32_t{-1}, [&] {
+        std::string text;
+        if (!Load(szPath, false, &text, __LINE__)) return int32_t{-1};
+        std::optional<std::string> value;
+        for (const std::string &line : SplitLines(text)) {
+            auto kv = ParseKeyValueLine(line);
+            if (kv && kv->key == szKey) value = std::string(kv->value);
+        }
+        if (!value) {
+            SetError(kErrKeyNotFound, kUnit, __LINE__);
+            return int32_t{-1};
+        }
+        size_t n = std::min(value->size(), static_cast<size_t>(cbBuf) - 1);
+        std::memcpy(szBuf, value->data(), n);
+        szBuf[n] = '\0';
+        return static_cast<int32_t>(n);
+    });
+}
+
+XAVO_PLATFORM_API int32_t ORLICFileSetKeyValue(const char *szPath, const char *szKey, const char *szValue,
+                                               const char *szLineFormat) {
+    if (XAVO_INJECTED()) return -1;
+    std::string line;
+    if (szPath == nullptr || !KeyOk(szKey) || !ValueOk(szValue) ||
+        !XAVO_GUARD(false, [&] { return FormatLine(szLineFormat, szKey, szValue, &line); })) {
+        SetError(kErrBadParameters, kUnit, __LINE__);
+        return -1;
+    }
+    return XAVO_GUARD(int32_t{-1}, [&] {
+        // A missing file is created: the USB printer table is gone after
+        // every restart until its first entry is set.
+        std::string text;
+        if (!Load(szPath, true, &text, __LINE__)) return int32_t{-1};
+        std::vector<std::string> lines = SplitLines(text);
+        auto first = std::find_if(lines.begin(), lines.end(),
+                                  [&](const std::string &l) { return IsKeyLine(l, szKey); });
+        if (first == lines.end()) {
+            if (!lines.empty() && lines.back().back() != '\n') lines.back().push_back('\n');
+            lines.push_back(line);
+        } else {
+            *first = line;
+            lines.erase(std::remove_if(first + 1, lines.end(),
+                                       [&](const std::string &l) { return IsKeyLine(l, szKey); }),
+                        lines.end());
+        }
+        std::string out;
+        for (const std::string &l : lines) out += l;
+        return Store(szPath, out) ? int32_t{0} : int32_t{-1};
+    });
+}
+
+// The number of lines removed: 0 when the key (or the whole file) is not
+// there, which is what the caller wanted and no failure.
+XAVO_PLATFORM_API int32_t ORLICFileRemoveKey(const char *szPath, const char *szKey) {
+    if (XAVO_INJECTED()) return -1;
+    if (szPath == nullptr || szKey == nullptr) {
+        SetError(kErrBadParameters, kUnit, __LINE__);
+        return -1;
+    }
+    return XAVO_GUARD(int32_t{-1}, [&] {
+        std::string text;
+        if (!Load(szPath, true, &text, __LINE__)) return int32_t{-1};
+        std::vector<std::string> lines = SplitLines(text);
+        auto kept = std::remove_if(lines.begin(), lines.end(), [&](const std::string &l) { return IsKeyLine(l, szKey); });
+        auto removed = static_cast<int32_t>(lines.end() - kept);
+        if (removed == 0) return int32_t{0};
+        lines.erase(kept, lines.end());
+        std::string out;
+        for (const std::string &l : lines) out += l;
+        return Store(szPath, out) ? removed : int32_t{-1};
+    });
+}
+
+XAVO_PLATFORM_API int32_t ORLICFileGetPair(const char *szPath, ORLICSzHash **ppHash) {
+    if (XAVO_INJECTED()) return -1;
+    if (szPath == nullptr || ppHash == nullptr || *ppHash == nullptr) {
+        SetError(kErrBadParameters, kUnit, __LINE__);
+        return -1;
+    }
+    return XAVO_GUARD(int32_t{-1}, [&] {
+        std::string text;
+        if (!Load(szPath, false, &text, __LINE__)) return int32_t{-1};
+        // Collected first, so that a file that cannot be read leaves the
+        // caller's hash as it was.  The pairs point into lines.
+        std::vector<std::string> lines = SplitLines(text);
+        std::vector<KeyValue> pairs;
+        for (const std::string &line : lines) {
+            if (auto kv = ParseKeyValueLine(line)) pairs.push_back(*kv);
+        }
+        for (const KeyValue &kv : pairs) xavo::core::HashSet(ppHash, kv.key, kv.value);
+        return static_cast<int32_t>(pairs.size());
+    });
+}

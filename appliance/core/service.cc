@@ -1,0 +1,68 @@
+// The appliance's services the printer library checks and starts.
+#include <cstring>
+#include <string>
+#include <vector>
+
+#include "core/internal.h"
+
+using namespace xavo::platform;
+
+namespace {
+constexpr char kUnit[] = "service";
+
+struct Service {
+    const char *name;      // as callers name it
+    const char *process;   // command name of its running daemon
+    const char *program;   // started with these arguments; daemonises
+    std::vector<std::string> argv;
+};
+
+const std::vector<Service> &Services() {
+    static const std::vector<Service> services = {
+        {"cupsd", "cupsd", "/usr/sbin/cupsd", {"/usr/sbin/cupsd"}},
+        {"avahi", "avahi-daemon", "/usr/sbin/avahi-daemon", {"/usr/sbin/avahi-daemon", "-D"}},
+    };
+    return services;
+}
+
+const Service *Find(const char *szService) {
+    if (szService == nullptr) return nullptr;
+    for (const Service &s : Services()) {
+        if (std::strcmp(s.name, szService) == 0) return &s;
+    }
+    return nullptr;
+}
+
+}  // namespace
+
+// 1 running, 0 stopped; -1 with the last error set for a service the
+// appliance does not have.
+XAVO_PLATFORM_API int32_t ORLIServiceIsRunning(const char *szService) {
+    if (XAVO_INJECTED()) return -1;
+    const Service *service = Find(szService);
+    if (service == nullptr) {
+        SetError(kErrBadParameters, kUnit, __LINE__);
+        return -1;
+    }
+    return XAVO_GUARD(int32_t{-1}, [&] { return xavo::core::ProcessAlive(service->process) ? int32_t{1} : int32_t{0}; });
+}
+
+// 0 when the service runs already or its start command succeeded (the
+// daemons detach once they are up); -1 with the last error set otherwise.
+XAVO_PLATFORM_API int32_t ORLIServiceStart(const char *szService, int32_t /*iFlags: none defined; callers pass 0*/) {
+    if (XAVO_INJECTED()) return -1;
+    const Service *service = Find(szService);
+    if (service == nullptr) {
+        SetError(kErrBadParameters, kUnit, __LINE__);
+        return -1;
+    }
+    return XAVO_GUARD(int32_t{-1}, [&] {
+        if (xavo::core::ProcessAlive(service->process)) return int32_t{0};
+        Failure failure;
+        if (xavo::core::RunAndWait(service->program, service->argv, &failure) != 0) {
+            SetError(failure.code, kUnit, failure.line);
+            return int32_t{-1};
+        }
+        return int32_t{0};
+    });
+}
