@@ -1,0 +1,54 @@
+#!/bin/sh
+# Installs, on a fresh Debian 12 as root, what building the library and
+# running its test suites needs.  Safe to run again: packages already
+# installed are left as they are and apt's lists are fetched once per run.
+#
+# The daemons among the test peers (cupsd, snmpd, avahi-daemon, dbus) are
+# started by the tests themselves inside their private namespaces, on their
+# own configuration.  A copy left running on the host by the package's
+# postinst would hold ports and sockets the tests expect free, so service
+# starts are refused while installing (policy-rc.d answers 101, "action
+# forbidden"); a policy-rc.d that was already there is kept unchanged.
+set -eu
+
+if [ "$(id -u)" -ne 0 ]; then
+    echo "install-deps.sh: must run as root" >&2
+    exit 1
+fi
+
+PACKAGES="cmake ninja-build g++ pkg-config libgtest-dev libgmock-dev libsodium-dev
+samba-common-bin iproute2 iputils-ping
+cups cups-client cups-bsd
+snmp snmpd
+avahi-daemon avahi-utils dbus
+psmisc procps"
+
+missing=""
+for p in $PACKAGES; do
+    if ! dpkg-query -W -f='${Status}' "$p" 2>/dev/null | grep -q '^install ok installed$'; then
+        missing="$missing $p"
+    fi
+done
+if [ -z "$missing" ]; then
+    exit 0
+fi
+
+export DEBIAN_FRONTEND=noninteractive
+POLICY=/usr/sbin/policy-rc.d
+made_policy=0
+if [ ! -e "$POLICY" ]; then
+    printf '#!/bin/sh\nexit 101\n' >"$POLICY"
+    chmod 0755 "$POLICY"
+    made_policy=1
+fi
+cleanup() {
+    if [ "$made_policy" -eq 1 ]; then
+        rm -f "$POLICY"
+    fi
+}
+trap cleanup EXIT INT TERM
+
+apt-get update -qq
+# shellcheck disable=SC2086
+apt-get install -y -qq --no-install-recommends \
+    -o Dpkg::Options::=--force-confdef -o Dpkg::Options::=--force-confold $missing >/dev/null
