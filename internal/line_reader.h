@@ -7,6 +7,8 @@
 
 #include <cerrno>
 #include <cstdio>
+#include <cstring>
+#include <string>
 
 namespace xavo {
 
@@ -24,6 +26,25 @@ inline ReadStatus ReadLine(FILE *pStream, char *szBuf, int cbBuf) {
         return ReadStatus::kInterrupted;
     }
     return ReadStatus::kEnd;
+}
+
+// Reads the next whole line, however long, into line (newline kept when
+// the line had one), growing it as needed: for readers that match text
+// anywhere in a line and must not see a long line cut in two.  kLine when
+// anything was read; kEnd at the end of the output; kInterrupted when a
+// read was interrupted, even part-way through a line (the part read so far
+// is in line, and the caller decides what an interruption means).
+inline ReadStatus ReadLine(FILE *pStream, std::string &line) {
+    line.clear();
+    char acPiece[512];
+    for (;;) {
+        ReadStatus st = ReadLine(pStream, acPiece, static_cast<int>(sizeof acPiece));
+        if (st == ReadStatus::kInterrupted) return st;
+        if (st == ReadStatus::kEnd) return line.empty() ? ReadStatus::kEnd : ReadStatus::kLine;
+        size_t n = std::strlen(acPiece);
+        line.append(acPiece, n);
+        if (n > 0 && acPiece[n - 1] == '\n') return ReadStatus::kLine;
+    }
 }
 
 }  // namespace xavo

@@ -1,0 +1,106 @@
+// Stores the cloud print account, its secret enciphered.
+#include <syslog.h>
+
+#include <string>
+
+#include "conf/conf_paths.h"
+#include "internal/boundary.h"
+#include "internal/guards.h"
+#include "internal/log.h"
+#include "internal/text.h"
+#include "share/google_info_section.h"
+#include "xavoprinter.h"
+
+namespace {
+constexpr char kUnit[] = "printer_google_info_set";
+constexpr char kLogNoAccount[] = "%s:%d google account can't be empty";
+constexpr char kLogEncryptFailed[] = "%s:%d encrypt failed";
+constexpr char kLogNoPassword[] = "%s:%d password can't be empty";
+constexpr char kLogNoToken[] = "%s:%d refresh token can't be empty";
+constexpr char kLogAddSectionFailed[] = "%s:%d ORLICFileAddSection failed.(0x%04X)";
+constexpr char kLogSetSectionFailed[] = "%s:%d ORLICFileSetSection failed.(0x%04X)";
+
+// Enciphers a record field into cipher; the field is copied first so that
+// a caller's unterminated field is never read past its end.  False when the
+// cipher fails.
+template <size_t N>
+bool Encipher(const char (&field)[N], xavo::SecretBuf<xavo::kCipherBufSize> &cipher) {
+    xavo::SecretBuf<N + 1> clear;
+    xavo::CopyText(clear.get(), clear.size(), xavo::FieldText(field));
+    if (ORLICCryptSzEncrypt(clear.get(), cipher.get(), cipher.size()) == 0) {
+        XLOG(LOG_ERR, kLogEncryptFailed);
+        return false;
+    }
+    return true;
+}
+
+// Writes the section whole: added when the file has none yet, replaced
+// otherwise.
+int32_t WriteSection(const xavo::SzHash &hash) {
+    int32_t iAdded = ORLICFileAddSection(xavo::kPrinterConfPath, xavo::kGoogleSection, hash.get(),
+                                         xavo::kSectionLineFormat);
+    if (iAdded > 0) return 0;
+    if (iAdded < 0) {
+        XLOG(LOG_ERR, kLogAddSectionFailed, ORLICErrGet());
+        return iAdded;
+    }
+    if (ORLICFileSetSection(xavo::kPrinterConfPath, xavo::kGoogleSection, xavo::kGoogleSection, hash.get(),
+                            xavo::kSectionLineFormat) > 0) {
+        return 0;
+    }
+    XLOG(LOG_ERR, kLogSetSectionFailed, ORLICErrGet());
+    // An account that was not stored is a failed set, whichever write
+    // refused it; the platform's error code stays as the replace left it.
+    return -1;
+}
+
+}  // namespace
+
+XAVO_EXPORT int32_t XAVOPrinterGoogleInfoSet(const PrinterGoogleInfo *pInfo) noexcept {
+    return XAVO_BOUNDARY(-1, [&] {
+        if (pInfo == nullptr) {
+            XSETERR(ERR_BAD_PARAMETERS);
+            return -1;
+        }
+        xavo::SzHash hash(ORLICSzHashAlloc(512));
+        if (!hash) {
+            XSETERR(ERR_OUT_OF_MEMORY);
+            return -1;
+        }
+        // Keys of the section this library does not know are kept.
+        ORLICFileGetSection(xavo::kPrinterConfPath, xavo::kGoogleSection, hash.addr());
+
+        const std::string account(xavo::FieldText(pInfo->szAccount));
+        if (account.empty() || ORLICSzHashSetValue(hash.addr(), xavo::kKeyGoogleAccount, account.c_str()) < 0) {
+            XLOG(LOG_ERR, kLogNoAccount);
+            return -1;
+        }
+
+        xavo::SecretBuf<xavo::kCipherBufSize> cipher;
+        if (pInfo->szPassword[0] != '\0') {
+            if (!Encipher(pInfo->szPassword, cipher)) return -1;
+            if (cipher.get()[0] == '\0' ||
+                ORLICSzHashSetValue(hash.addr(), xavo::kKeyGooglePass, cipher.get()) < 0) {
+                XLOG(LOG_ERR, kLogNoPassword);
+                return -1;
+            }
+            // A token stored earlier stays beside the password, which is
+            // the one in force.
+        } else {
+            if (!Encipher(pInfo->szRefreshToken, cipher)) return -1;
+            if (cipher.get()[0] == '\0' ||
+                ORLICSzHashSetValue(hash.addr(), xavo::kKeyRefreshToken, cipher.get()) < 0) {
+                XLOG(LOG_ERR, kLogNoToken);
+                return -1;
+            }
+            ORLICSzHashRemoveKey(hash.get(), xavo::kKeyGooglePass);
+        }
+
+        xavo::PrinterLock lock;
+        if (!lock.held()) {
+            XSETERR(ERR_LOCK);
+            return -1;
+        }
+        return WriteSection(hash);
+    });
+}

@@ -1,0 +1,500 @@
+// Printing and jobs: lpr's argument vector, reading lpq listings, cleaning
+// the spool, and the same operations against a real CUPS scheduler.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/stat.h>
+
+#include <cstring>
+#include <string>
+#include <vector>
+
+#include "appliance/standin_control.h"
+#include "support/cupsd.h"
+#include "support/logs.h"
+#include "support/socket_listener.h"
+#include "xavoprinter.h"
+
+using ::testing::ElementsAre;
+using ::testing::ElementsAreArray;
+using ::testing::HasSubstr;
+using ::testing::IsEmpty;
+using ::testing::StartsWith;
+using xavo::test::FileExists;
+using xavo::test::Logs;
+using xavo::test::PlaceFile;
+using xavo::test::PlaceProgram;
+using xavo::test::ReadFile;
+
+namespace {
+
+constexpr char kConf[] = "/usr/xavo/etc/printer.conf";
+constexpr char kPrinter[] = "04b8:0005:SN0001";
+constexpr char kQueue[] = "usbprinter1";
+constexpr char kTestPage[] = "/usr/share/cups/data/testprint";
+constexpr char kSpool[] = "/var/services/printer";
+
+void SetCupsName(const std::string &printerId, const std::string &queue) {
+    ORLICSzHash *hash = ORLICSzHashAlloc(512);
+    ORLICSzHashSetValue(&hash, "cups printer name", queue.c_str());
+    ORLICFileAddSection(kConf, printerId.c_str(), hash, "\t%s = %s\n");
+    ORLICSzHashFree(hash);
+}
+
+std::vector<std::string> Lines(const std::string &text) {
+    std::vector<std::string> out;
+    for (size_t pos = 0, nl; (nl = text.find('\n', pos)) != std::string::npos; pos = nl + 1) {
+        out.push_back(text.substr(pos, nl - pos));
+    }
+    return out;
+}
+
+// A program that writes each argument on a line of its own to
+// /tmp/<name>.argv, appends a line to /tmp/<name>.calls and exits with the
+// status kept in /tmp/<name>.exit (0 when there is none).
+void PlaceRecorder(const std::string &path, const std::string &name) {
+    PlaceProgram(path, "#!/bin/sh\n"
+                       "for a in \"$@\"; do printf '%s\\n' \"$a\"; done > /tmp/" + name + ".argv\n"
+                       "echo run >> /tmp/" + name + ".calls\n"
+                       "exit $(cat /tmp/" + name + ".exit 2>/dev/null || echo 0)\n");
+}
+
+int Calls(const std::string &name) { return static_cast<int>(Lines(ReadFile("/tmp/" + name + ".calls")).size()); }
+
+// ---- submission -------------------------------------------------------
+
+struct LprCase {
+    const char *szName;
+    const char *szTitle;
+    int32_t blRemove;
+    std::vector<std::string> args;  // after the program path
+};
+
+const LprCase kLprCases[] = {
+    {"remove and title", "Quarterly report", 1, {"-P", kQueue, "-r", "-T", "Quarterly report", "/tmp/doc.pdf"}},
+    {"remove only", nullptr, 1, {"-P", kQueue, "-r", "/tmp/doc.pdf"}},
+    {"title only", "t;$(id)", 0, {"-P", kQueue, "-T", "t;$(id)", "/tmp/doc.pdf"}},
+    {"remove flag 2 keeps the file", nullptr, 2, {"-P", kQueue, "/tmp/doc.pdf"}},
+    {"remove flag -1 keeps the file", "", -1, {"-P", kQueue, "/tmp/doc.pdf"}},
+    {"empty title is no title", "", 1, {"-P", kQueue, "-r", "/tmp/doc.pdf"}},
+};
+
+class PrintFileArgs : public ::testing::TestWithParam<LprCase> {};
+
+TEST_P(PrintFileArgs, LprGetsExactlyTheOptionsAsked) {
+    const LprCase &c = GetParam();
+    SetCupsName(kPrinter, kQueue);
+    PlaceRecorder("/usr/bin/lpr", "lpr");
+    EXPECT_EQ(XAVOPrinterCupsPrintFile(kPrinter, "/tmp/doc.pdf", c.szTitle, c.blRemove), 0);
+    EXPECT_THAT(Lines(ReadFile("/tmp/lpr.argv")), ElementsAreArray(c.args));
+    EXPECT_THAT(Logs(), IsEmpty());
+}
+
+INSTANTIATE_TEST_SUITE_P(Options, PrintFileArgs, ::testing::ValuesIn(kLprCases), [](const auto &p) {
+    std::string s = p.param.szName;
+    for (char &ch : s) if (!isalnum(static_cast<unsigned char>(ch))) ch = '_';
+    return s;
+});
+
+TEST(PrintFile, LprFailureSetsErrExecAndLogsTheResult) {
+    SetCupsName(kPrinter, kQueue);
+    PlaceRecorder("/usr/bin/lpr", "lpr");
+    PlaceFile("/tmp/lpr.exit", "4\n");
+    PlaceFile("/tmp/doc.pdf", "%PDF-1.4\n");
+    EXPECT_EQ(XAVOPrinterCupsPrintFile(kPrinter, "/tmp/doc.pdf", "t", 1), -1);
+    EXPECT_EQ(ORLICErrGet(), ERR_EXEC);
+    std::vector<std::string> logs = Logs();
+    ASSERT_EQ(logs.size(), 1u);
+    EXPECT_THAT(logs[0], StartsWith("3 printer_cups_print_file:N execv error, cmd=/usr/bin/lpr, ret="));
+    EXPECT_NE(logs[0], "3 printer_cups_print_file:N execv error, cmd=/usr/bin/lpr, ret=0");
+    EXPECT_TRUE(FileExists("/tmp/doc.pdf"));
+}
+
+TEST(PrintFile, PrinterWithoutQueueNameNeverRunsLpr) {
+    PlaceRecorder("/usr/bin/lpr", "lpr");
+    SetCupsName("no-name-printer", "");
+    for (const char *id : {"no-such-printer", "no-name-printer", ""}) {
+        EXPECT_EQ(XAVOPrinterCupsPrintFile(id, "/tmp/doc.pdf", nullptr, 0), -1) << id;
+        EXPECT_THAT(Logs(), ElementsAre(std::string("3 printer_cups_name_get:N get cups printer name failed, printer=") + id,
+                                        std::string("3 printer_cups_print_file:N cannot get cups printer name, printer=") + id));
+    }
+    EXPECT_EQ(Calls("lpr"), 0);
+}
+
+TEST(PrintFile, NullArgumentsFailSilentlyWithBadParameters) {
+    PlaceRecorder("/usr/bin/lpr", "lpr");
+    SetCupsName(kPrinter, kQueue);
+    EXPECT_EQ(XAVOPrinterCupsPrintFile(nullptr, "/tmp/doc.pdf", nullptr, 0), -1);
+    EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
+    ORLICErrSetEx(0, "test", 0);
+    EXPECT_EQ(XAVOPrinterCupsPrintFile(kPrinter, nullptr, nullptr, 0), -1);
+    EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
+    for (const char *id : {static_cast<const char *>(nullptr), ""}) {
+        ORLICErrSetEx(0, "test", 0);
+        EXPECT_EQ(XAVOPrinterCupsPrintTestPage(id), -1);
+        EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
+    }
+    EXPECT_THAT(Logs(), IsEmpty());
+    EXPECT_EQ(Calls("lpr"), 0);
+}
+
+TEST(PrintTestPage, SubmitsTheSharedPageWithoutRemoveOrTitle) {
+    SetCupsName(kPrinter, kQueue);
+    PlaceRecorder("/usr/bin/lpr", "lpr");
+    EXPECT_EQ(XAVOPrinterCupsPrintTestPage(kPrinter), 0);
+    EXPECT_THAT(Lines(ReadFile("/tmp/lpr.argv")), ElementsAre("-P", kQueue, kTestPage));
+
+    PlaceFile("/tmp/lpr.exit", "1\n");
+    EXPECT_EQ(XAVOPrinterCupsPrintTestPage(kPrinter), -1);
+    EXPECT_EQ(ORLICErrGet(), ERR_EXEC);
+    std::vector<std::string> logs = Logs();
+    ASSERT_EQ(logs.size(), 2u);
+    EXPECT_THAT(logs[0], StartsWith("3 printer_cups_print_file:N execv error, cmd=/usr/bin/lpr, ret="));
+    EXPECT_EQ(logs[1], std::string("3 printer_cups_print_test_page:N cannot print test page, printer id=") + kPrinter);
+}
+
+// Each platform call of a submission failed in turn: -1, lpr's own failure
+// reported as ERR_EXEC, the file left where it was, nothing leaked.
+TEST(PrintFileFaults, EveryPlatformFailureFailsTheSubmission) {
+    SetCupsName(kPrinter, kQueue);
+    PlaceRecorder("/usr/bin/lpr", "lpr");
+    PlaceFile("/tmp/doc.pdf", "%PDF-1.4\n");
+    int nFailed = 0;
+    for (int n = 1; n < 50; ++n) {
+        XavoStandinReset();
+        XavoStandinFailCall("*", n, 0x0E00);
+        int32_t r = XAVOPrinterCupsPrintFile(kPrinter, "/tmp/doc.pdf", "title", 1);
+        const char *szFailed = XavoStandinLastFailed();
+        uint32_t uCode = ORLICErrGet();
+        XavoStandinReset();
+        if (szFailed == nullptr) {
+            EXPECT_EQ(r, 0);
+            break;
+        }
+        ++nFailed;
+        EXPECT_EQ(r, -1) << szFailed;
+        if (std::string(szFailed) == "ORLICExecv") {
+            EXPECT_EQ(uCode, ERR_EXEC);
+        } else {
+            EXPECT_EQ(uCode, 0x0E00u) << szFailed;
+        }
+        Logs();
+    }
+    EXPECT_GE(nFailed, 2);
+}
+
+// ---- job listings -------------------------------------------------------
+
+// lpq's output as CUPS prints it.
+constexpr char kListingHeader[] = "usbprinter1 is not ready\n"
+                                  "Rank    Owner   Job     File(s)                         Total Size\n";
+constexpr char kListingJobs[] = "1st     root    123     report.pdf                      2048 bytes\n"
+                                "2nd     admin   124     scan 4.tif                      1055 bytes\n";
+constexpr char kListingEmpty[] = "usbprinter1 is ready\nno entries\n";
+
+// An lpq that prints the listing kept in /tmp/lpq.out and counts its runs.
+void PlaceLpq(const std::string &listing) {
+    PlaceFile("/tmp/lpq.out", listing);
+    PlaceProgram("/usr/bin/lpq", "#!/bin/sh\n"
+                                 "echo run >> /tmp/lpq.calls\n"
+                                 "for a in \"$@\"; do printf '%s\\n' \"$a\"; done > /tmp/lpq.argv\n"
+                                 "cat /tmp/lpq.out\n");
+}
+
+struct ListingCase {
+    const char *szName;
+    std::string listing;
+    const char *szJobId;
+    int32_t result;
+};
+
+const ListingCase kListingCases[] = {
+    {"job listed", std::string(kListingHeader) + kListingJobs, "123", 1},
+    {"prefix of a larger job number", std::string(kListingHeader) + kListingJobs, "12", 1},
+    {"job not among others", std::string(kListingHeader) + kListingJobs, "7", 0},
+    {"empty queue", kListingEmpty, "125", 0},
+    {"job ID inside the printer name", kListingEmpty, "1", 1},
+    {"last line without newline", "usbprinter1 is ready\n1st root 99 f 1 bytes", "99", 1},
+    {"no output at all", "", "5", 0},
+    // A job ID that lies across the first 511 bytes of a long line is found.
+    {"match across a long line", std::string(kListingHeader) + std::string(508, 'x') + "ABCDEF\n", "xxABCD", 1},
+};
+
+// A process the appliance takes for a running scheduler ("cupsd" is its
+// command name), for the tests whose lpq is a fake.
+class SchedulerStandIn {
+public:
+    SchedulerStandIn() {
+        PlaceFile("/tmp/cupsd", ReadFile("/bin/sleep"), 0755);
+        char *args[] = {const_cast<char *>("/tmp/cupsd"), const_cast<char *>("120"), nullptr};
+        if (posix_spawn(&pid_, args[0], nullptr, nullptr, args, environ) != 0) pid_ = -1;
+    }
+    SchedulerStandIn(const SchedulerStandIn &) = delete;
+    SchedulerStandIn &operator=(const SchedulerStandIn &) = delete;
+    ~SchedulerStandIn() {
+        if (pid_ > 0) {
+            kill(pid_, SIGKILL);
+            waitpid(pid_, nullptr, 0);
+        }
+    }
+
+private:
+    pid_t pid_ = -1;
+};
+
+class JobWaitListing : public ::testing::TestWithParam<ListingCase> {
+protected:
+    void SetUp() override { SetCupsName(kPrinter, kQueue); }
+    SchedulerStandIn scheduler_;
+};
+
+TEST_P(JobWaitListing, AnswersWhetherTheJobIsListed) {
+    const ListingCase &c = GetParam();
+    PlaceLpq(c.listing);
+    Logs();
+    EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(kPrinter, c.szJobId), c.result);
+    EXPECT_THAT(Lines(ReadFile("/tmp/lpq.argv")), ElementsAre("-P", kQueue));
+    EXPECT_EQ(Calls("lpq"), 1);
+    EXPECT_THAT(xavo::test::TakeSleeps(), IsEmpty());
+    std::vector<std::string> logs = Logs();
+    if (c.result == 1) {
+        ASSERT_EQ(logs.size(), 1u);
+        EXPECT_THAT(logs[0], StartsWith("3 printer_cups_job_wait_complete:N CheckJobIdInQueue failed. ("));
+    } else {
+        EXPECT_THAT(logs, IsEmpty());
+    }
+}
+
+INSTANTIATE_TEST_SUITE_P(Listings, JobWaitListing, ::testing::ValuesIn(kListingCases), [](const auto &p) {
+    std::string s = p.param.szName;
+    for (char &ch : s) if (!isalnum(static_cast<unsigned char>(ch))) ch = '_';
+    return s;
+});
+
+void Ignore(int) {}
+
+// Catches SIGUSR1 without SA_RESTART, so that a read blocked when it
+// arrives fails with EINTR; the fake lpq sends it to its parent.
+class InterruptibleReads {
+public:
+    InterruptibleReads() {
+        struct sigaction sa {};
+        sa.sa_handler = Ignore;
+        sigaction(SIGUSR1, &sa, &old_);
+    }
+    ~InterruptibleReads() { sigaction(SIGUSR1, &old_, nullptr); }
+
+private:
+    struct sigaction old_ {};
+};
+
+// An lpq that prints a header, interrupts its reader while the reader
+// waits for more, and then prints the rest; only its first
+// iInterruptedRuns runs interrupt.
+void PlaceInterruptingLpq(int iInterruptedRuns) {
+    PlaceProgram("/usr/bin/lpq", "#!/bin/sh\n"
+                                 "echo run >> /tmp/lpq.calls\n"
+                                 "printf 'usbprinter1 is ready\\n'\n"
+                                 "if [ $(wc -l < /tmp/lpq.calls) -le " + std::to_string(iInterruptedRuns) + " ]; then\n"
+                                 "  sleep 0.3; kill -USR1 $PPID; sleep 0.3\n"
+                                 "  printf '1st root 42 late.pdf 1 bytes\\n'\n"
+                                 "fi\n"
+                                 "printf 'no entries\\n'\n");
+}
+
+TEST_F(JobWaitListing, InterruptedListingIsTakenAgainAfterASecond) {
+    InterruptibleReads interruptible;
+    PlaceInterruptingLpq(1);
+    // Job 42 shows only in the interrupted listing, after the
+    // interruption: the call must not have read past it.
+    EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(kPrinter, "42"), 0);
+    EXPECT_EQ(Calls("lpq"), 2);
+    EXPECT_THAT(xavo::test::TakeSleeps(), ElementsAre(1000000u));
+    EXPECT_THAT(Logs(), IsEmpty());
+}
+
+TEST_F(JobWaitListing, ListingThatNeverCompletesGivesUpAfterThreeTries) {
+    InterruptibleReads interruptible;
+    PlaceInterruptingLpq(100);
+    EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(kPrinter, "77"), -1);
+    EXPECT_EQ(ORLICErrGet(), ERR_EXEC);
+    EXPECT_EQ(Calls("lpq"), 3);
+    EXPECT_THAT(xavo::test::TakeSleeps(), ElementsAre(1000000u, 1000000u));
+    EXPECT_THAT(Logs(), ElementsAre("3 printer_cups_job_wait_complete:N queue of usbprinter1 unreadable after 3 listings"));
+}
+
+TEST_F(JobWaitListing, LpqThatCannotBeStartedFailsWithThePlatformsError) {
+    PlaceLpq(kListingEmpty);
+    XavoStandinFailCall("ORLICPopen", 1, 0x0900);
+    EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(kPrinter, "5"), -1);
+    XavoStandinReset();
+    EXPECT_EQ(ORLICErrGet(), 0x0900u);
+    std::vector<std::string> logs = Logs();
+    ASSERT_EQ(logs.size(), 1u);
+    EXPECT_THAT(logs[0], StartsWith("3 printer_cups_job_wait_complete:N open failed. [0x0900 "));
+    EXPECT_EQ(Calls("lpq"), 0);
+}
+
+TEST(JobWait, StoppedSchedulerIsReportedBeforeLpqRuns) {
+    SetCupsName(kPrinter, kQueue);
+    PlaceLpq(kListingEmpty);
+    EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(kPrinter, "5"), -1);
+    EXPECT_THAT(Logs(), ElementsAre("3 printer_cups_job_wait_complete:N cupsd is not running."));
+    EXPECT_EQ(Calls("lpq"), 0);
+}
+
+TEST(JobWait, BadArgumentsAndUnknownPrintersFail) {
+    SetCupsName(kPrinter, kQueue);
+    PlaceLpq(kListingEmpty);
+    EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(nullptr, "5"), -1);
+    EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
+    ORLICErrSetEx(0, "test", 0);
+    EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(kPrinter, nullptr), -1);
+    EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
+    EXPECT_THAT(Logs(), IsEmpty());
+    EXPECT_EQ(XAVOPrinterCupsJobWaitComplete("other", "5"), -1);
+    EXPECT_THAT(Logs(), ElementsAre("3 printer_cups_name_get:N get cups printer name failed, printer=other",
+                                    "3 printer_cups_job_wait_complete:N get cups printer name failed, printer=other"));
+    EXPECT_EQ(Calls("lpq"), 0);
+}
+
+// ---- spool ---------------------------------------------------------------
+
+TEST(CleanSpool, RemovesEveryNameWithADotAsAPlainName) {
+    PlaceRecorder("/usr/bin/lprm", "lprm");
+    // Names a shell would act on: run through one, they would leave
+    // "pwned" files behind (in the spool or the working directory).
+    const std::vector<std::string> removed = {
+        "job1.ps", "a;touch pwned;.ps", "$(touch pwned2).pdf", "`touch pwned3`.txt", "x|touch pwned4.ps",
+        "spaced name .pcl", "star*.ps", "quote'\".ps", "dir.d/inner", "trailing."};
+    const std::vector<std::string> kept = {"noext", ".hidden", "sub/x.ps", "*", "-rf"};
+    for (const std::string &f : removed) PlaceFile(std::string(kSpool) + "/" + f, "data");
+    for (const std::string &f : kept) PlaceFile(std::string(kSpool) + "/" + f, "data");
+
+    EXPECT_EQ(XAVOPrinterCleanSpool(), 0);
+    EXPECT_THAT(Lines(ReadFile("/tmp/lprm.argv")), ElementsAre("all"));
+    for (const std::string &f : removed) EXPECT_FALSE(FileExists(std::string(kSpool) + "/" + f)) << f;
+    for (const std::string &f : kept) EXPECT_TRUE(FileExists(std::string(kSpool) + "/" + f)) << f;
+    EXPECT_FALSE(FileExists(std::string(kSpool) + "/dir.d"));
+    char szCwd[4096] = "/";
+    ASSERT_NE(getcwd(szCwd, sizeof szCwd), nullptr);
+    for (const std::string &dir : {std::string(kSpool), std::string(szCwd), std::string("/"), std::string("/tmp")}) {
+        for (const char *p : {"pwned", "pwned2", "pwned3", "pwned4.ps"}) {
+            EXPECT_FALSE(FileExists(dir + "/" + p)) << dir << "/" << p;
+        }
+    }
+    EXPECT_THAT(Logs(), IsEmpty());
+}
+
+TEST(CleanSpool, LprmFailureIsOnlyLoggedAndEmptySpoolSucceeds) {
+    PlaceRecorder("/usr/bin/lprm", "lprm");
+    PlaceFile("/tmp/lprm.exit", "1\n");
+    for (bool bDirExists : {false, true}) {
+        if (bDirExists) mkdir(kSpool, 0755);
+        EXPECT_EQ(XAVOPrinterCleanSpool(), 0);
+        std::vector<std::string> logs = Logs();
+        ASSERT_EQ(logs.size(), 1u);
+        EXPECT_THAT(logs[0], StartsWith("3 printer_clean_spool:N lprm all failed. [0x"));
+    }
+}
+
+TEST(CleanSpool, RmFailureFailsWithThePlatformsError) {
+    PlaceRecorder("/usr/bin/lprm", "lprm");
+    PlaceFile(std::string(kSpool) + "/job.ps", "x");
+    PlaceRecorder("/bin/rm", "rm");
+    PlaceFile("/tmp/rm.exit", "1\n");
+    EXPECT_EQ(XAVOPrinterCleanSpool(), -1);
+    EXPECT_THAT(Lines(ReadFile("/tmp/rm.argv")), ElementsAre("-rf", std::string(kSpool) + "/job.ps"));
+    std::vector<std::string> logs = Logs();
+    ASSERT_EQ(logs.size(), 1u);
+    EXPECT_THAT(logs[0], StartsWith("3 printer_clean_spool:N remove /var/services/printer failed. [0x"));
+}
+
+// ---- against the real scheduler -----------------------------------------
+
+XAVO_SANDBOX_PER_SUITE(RealCups);
+
+class RealCups : public ::testing::Test {
+protected:
+    void SetUp() override {
+        xavo::test::Cupsd::Start();
+        xavo::test::Cupsd::RemoveAllQueues();
+        if (!FileExists(kTestPage)) PlaceFile(kTestPage, "%!PS-Adobe-3.0\n%%Title: test page\nshowpage\n");
+    }
+    static void TearDownTestSuite() {
+        // The scheduler is our child: reaped here by its id once stopped.
+        pid_t pid = xavo::test::Cupsd::Pid();
+        xavo::test::Cupsd::Stop();
+        if (pid > 0) waitpid(pid, nullptr, 0);
+    }
+
+    // A raw network queue printing to the listener.
+    static std::string NetQueue(const xavo::test::SocketListener &printer) {
+        const std::string name = "netprinter";
+        xavo::test::Tool({"/usr/sbin/lpadmin", "-p", name, "-v",
+                          "socket://127.0.0.1:" + std::to_string(printer.Port()), "-E"});
+        const std::string id = "127.0.0.1-" + name;
+        SetCupsName(id, name);
+        return id;
+    }
+    // A USB-style queue that holds its jobs: disabled, nothing behind it.
+    static std::string StalledQueue() {
+        const std::string name = "stalled";
+        xavo::test::Tool({"/usr/sbin/lpadmin", "-p", name, "-v", "usb://ACME/Model%20100?serial=SN9", "-E"});
+        xavo::test::Tool({"/usr/sbin/cupsdisable", name});
+        SetCupsName("04b8:0005:SN9", name);
+        return "04b8:0005:SN9";
+    }
+    static std::string Listing(const std::string &queue) { return xavo::test::Tool({"/usr/bin/lpq", "-P", queue}); }
+};
+
+TEST_F(RealCups, FileReachesTheNetworkPrinterUnchanged) {
+    xavo::test::SocketListener printer;
+    ASSERT_NE(printer.Port(), 0);
+    const std::string id = NetQueue(printer);
+    std::string data = "\x1b%-12345X@PJL\r\n";
+    for (int i = 0; i < 256; ++i) data += static_cast<char>(i);
+    PlaceFile("/tmp/job.bin", data);
+    ASSERT_EQ(XAVOPrinterCupsPrintFile(id.c_str(), "/tmp/job.bin", "bytes", 0), 0);
+    EXPECT_EQ(printer.WaitForBytes(data.size(), 30000), data);
+    EXPECT_TRUE(FileExists("/tmp/job.bin"));
+}
+
+TEST_F(RealCups, TestPageReachesThePrinterAndStays) {
+    xavo::test::SocketListener printer;
+    const std::string id = NetQueue(printer);
+    const std::string page = ReadFile(kTestPage);
+    ASSERT_EQ(XAVOPrinterCupsPrintTestPage(id.c_str()), 0);
+    EXPECT_EQ(printer.WaitForBytes(page.size(), 30000), page);
+    EXPECT_TRUE(FileExists(kTestPage));
+}
+
+TEST_F(RealCups, HeldJobIsListedUntilCancelledAndCarriesItsTitle) {
+    const std::string id = StalledQueue();
+    PlaceFile("/tmp/held.txt", "held job\n");
+    ASSERT_EQ(XAVOPrinterCupsPrintFile(id.c_str(), "/tmp/held.txt", "Payroll", 1), 0);
+    EXPECT_FALSE(FileExists("/tmp/held.txt"));  // lpr took it and removed it
+    const std::string listing = Listing("stalled");
+    EXPECT_THAT(listing, HasSubstr("Payroll"));
+
+    // lpstat -o stalled: "stalled-<job> root ..."
+    const std::string jobs = xavo::test::Tool({"/usr/bin/lpstat", "-o", "stalled"});
+    ASSERT_THAT(jobs, StartsWith("stalled-"));
+    const std::string job = jobs.substr(8, jobs.find(' ') - 8);
+    EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(id.c_str(), job.c_str()), 1) << listing;
+    EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(id.c_str(), job.c_str()), 1);
+
+    xavo::test::Tool({"/usr/bin/lprm", "-P", "stalled", job});
+    EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(id.c_str(), job.c_str()), 0) << Listing("stalled");
+}
+
+TEST_F(RealCups, CleanSpoolEmptiesTheSpoolWhateverLprmSays) {
+    PlaceFile(std::string(kSpool) + "/smbprn.00000001.x", "spooled");
+    PlaceFile(std::string(kSpool) + "/keep", "not matched");
+    EXPECT_EQ(XAVOPrinterCleanSpool(), 0);
+    EXPECT_FALSE(FileExists(std::string(kSpool) + "/smbprn.00000001.x"));
+    EXPECT_TRUE(FileExists(std::string(kSpool) + "/keep"));
+    Logs();
+}
+
+}  // namespace
