@@ -177,6 +177,25 @@ TEST_F(CupsFaults, QueueListThatCannotBeReadFailsTheChecksButNotTheNameChoice) {
     sigaction(SIGUSR1, &old, nullptr);
 }
 
+// The queue name is cut from each listing line: after the second blank, up
+// to the first ':'.  Lines without two blanks name no queue.
+TEST_F(CupsFaults, NameLookupCutsQueueNamesFromListingLines) {
+    struct {
+        const char *szListing;
+        int32_t iExpected;
+    } const cases[] = {
+        {"office\ndevice for\ndevice office: socket://10.0.0.11/\n", 0},
+        {"device for office\n", 2},
+        {"device for offices: socket://10.0.0.11/\ndevice for office: lpd://10.0.0.12/\n", 2},
+        {"  device for office: socket://10.0.0.11/  \n", 1},
+        {"a b office:socket://10.0.0.11/q\ndevice for office: lpd://10.0.0.12/\n", 1},
+    };
+    for (const auto &c : cases) {
+        PlaceProgram("/usr/bin/lpstat", std::string("#!/bin/sh\nprintf '") + c.szListing + "'\n");
+        EXPECT_EQ(XAVOPrinterNetCupsNameAndIPCheck("10.0.0.11", "office"), c.iExpected) << c.szListing;
+    }
+}
+
 TEST_F(CupsFaults, StoppedSchedulerIsReportedByChecksAndStartedByCreation) {
     Cupsd::Stop();
     if (Cupsd::OthersRunning()) GTEST_SKIP() << "another suite's cupsd runs: the platform would see it";
