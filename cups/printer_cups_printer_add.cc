@@ -9,7 +9,6 @@
 #include "internal/boundary.h"
 #include "internal/guards.h"
 #include "internal/log.h"
-#include "internal/text.h"
 #include "xavoprinter.h"
 
 namespace {

@@ -1,6 +1,7 @@
 #include <syslog.h>
 
 #include <cstdio>
+#include <string_view>
 
 #include "cups/queue_create.h"
 #include "internal/boundary.h"
