@@ -25,6 +25,7 @@
 
 extern "C" {
 int XavoProbeOpen(const char *path, int flags);
+int XavoProbeOpenMode(const char *path, int flags, mode_t mode);
 int XavoProbeOpenAt(const char *path, int flags);
 int XavoProbeIoctl(int fd, unsigned long request, void *arg);
 unsigned int XavoProbeSleep(unsigned int seconds);
@@ -277,15 +278,24 @@ TEST(SimulatedUsblp, OpenAnswersAsConfigured) {
         {"present", true, {}, {0, 0}},
         {"busy twice", true, {.busyOpens = 2}, {EBUSY, EBUSY, 0, 0}},
     };
+    // Successive opens take turns among the entry points: fortified open()
+    // (__open_2), open() with a mode, fortified openat() (__openat_2).
+    struct Entry {
+        std::function<int()> open;
+        int flags;
+    };
+    const std::vector<Entry> entries = {
+        {[] { return XavoProbeOpen("/dev/usb/lp1", O_RDONLY); }, O_RDONLY},
+        {[] { return XavoProbeOpenMode("/dev/usb/lp1", O_RDWR | O_CREAT, 0600); }, O_RDWR | O_CREAT},
+        {[] { return XavoProbeOpenAt("/dev/usb/lp1", O_RDONLY | O_NONBLOCK); }, O_RDONLY | O_NONBLOCK},
+    };
     for (const Case &c : cases) {
         SCOPED_TRACE(c.name);
         xt::ResetSandbox();
         if (c.configure) xt::SetUsblp("lp1", c.config);
         std::vector<int> got;
         for (size_t i = 0; i < c.errnos.size(); ++i) {
-            // Alternate the entry points: open() fortified, and openat().
-            const int fd = i % 2 == 0 ? XavoProbeOpen("/dev/usb/lp1", O_RDONLY)
-                                      : XavoProbeOpenAt("/dev/usb/lp1", O_RDONLY | O_NONBLOCK);
+            const int fd = entries[i % entries.size()].open();
             got.push_back(ErrnoOf(fd));
             if (fd >= 0) close(fd);
         }
@@ -293,10 +303,14 @@ TEST(SimulatedUsblp, OpenAnswersAsConfigured) {
         const xt::UsblpSeen seen = xt::GetUsblp("lp1");
         EXPECT_EQ(seen.opens, c.configure ? static_cast<int>(c.errnos.size()) : 0);
         if (c.configure) {
-            EXPECT_EQ(seen.lastOpenFlags, c.errnos.size() % 2 == 0 ? O_RDONLY | O_NONBLOCK : O_RDONLY);
+            EXPECT_EQ(seen.lastOpenFlags, entries[(c.errnos.size() - 1) % entries.size()].flags);
         }
         EXPECT_EQ(seen.openNow, 0);
     }
+    // O_CREAT on an absent device creates nothing.
+    xt::SetUsblp("lp1", {.present = false});
+    EXPECT_EQ(ErrnoOf(XavoProbeOpenMode("/dev/usb/lp1", O_RDWR | O_CREAT, 0600)), ENOENT);
+    EXPECT_FALSE(xt::FileExists("/dev/usb/lp1"));
 }
 
 TEST(SimulatedUsblp, RequestsAnswerAsTheDriverDoes) {
@@ -355,6 +369,19 @@ TEST(SimulatedUsblp, OtherPathsAndDescriptorsReachTheSystem) {
     close(pipes[1]);
     EXPECT_TRUE(xt::GetUsblp("lp0").requests.empty());
 }
+
+#ifdef XAVO_USBLP_PRELOAD
+TEST(SimulatedUsblp, PreloadedShimServesExecutedPrograms) {
+    xt::SetUsblp("lp0", {.busyOpens = 1});
+    // The shell's own open() of a redirection: busy first, then opened.
+    const std::string shell = std::string("LD_PRELOAD=") + XAVO_USBLP_PRELOAD +
+                              " /bin/sh -c 'cat </dev/usb/lp0 || cat </dev/usb/lp0 && echo opened'";
+    const Ran ran = RunCommand(shell);
+    EXPECT_EQ(ran.status, 0) << ran.output;
+    EXPECT_NE(ran.output.find("opened"), std::string::npos) << ran.output;
+    EXPECT_EQ(xt::GetUsblp("lp0").opens, 2);
+}
+#endif
 
 // ---- sysfs ----------------------------------------------------------------------
 

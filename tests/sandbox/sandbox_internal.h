@@ -30,8 +30,8 @@ void ResetSleeps();
 
 // Suites registered with XAVO_SANDBOX_PER_SUITE.
 bool IsPerSuite(const std::string &suite);
-// Tells on stderr which processes started in the sandbox still run
-// (zombies included) after "what" ended.
+// Tells on stderr which processes started in the sandbox still run after
+// "what" ended.
 void ReportLeftovers(const std::string &what);
 // At the end of the run: stops, by their ids, the processes that are still
 // left, so that nothing outlives the test executable.
