@@ -7,28 +7,34 @@
 //         static void TearDownTestSuite() { xavo::test::Cupsd::Stop(); }
 //     };
 //
-// Start() writes a private /etc/cups/cupsd.conf (listening only on the
-// domain socket /run/cups/cups.sock, no browsing, every local request
-// allowed), puts exec wrappers at the program paths the library uses where
-// Debian installs the tools elsewhere ("/usr/bin/lpadmin",
-// "/usr/bin/cupsenable", "/usr/bin/cupsdisable"), runs "/usr/sbin/cupsd -f"
-// and waits until "lpstat -r" reports it running.  It does nothing when a
-// scheduler of this sandbox already runs, so calling it from SetUp() is
-// cheap.  Stop() ends the scheduler of this sandbox by its process id, also
-// one that the platform started through ORLIServiceStart("cupsd"), and
-// waits until it is gone (cupsd writes printers.conf on its way out).
+// API (all static, header only):
+//   Start()            configure (below), then run "/usr/sbin/cupsd -f" unless
+//                      this sandbox's scheduler already runs, and wait until
+//                      "lpstat -r" reports it running: cheap from SetUp().
+//   Stop()             end this sandbox's scheduler by its process id (also
+//                      one the platform started with ORLIServiceStart) and
+//                      wait until it is gone; cupsd writes printers.conf on
+//                      its way out.
+//   Pid()              this sandbox's scheduler (same mount namespace), or 0.
+//   OthersRunning()    a scheduler of another sandbox runs: the platform's
+//                      ORLIServiceIsRunning("cupsd") looks machine-wide, so a
+//                      test that needs "cupsd" stopped skips then.
+//   Configure()        the private /etc/cups/cupsd.conf (only the domain
+//                      socket /run/cups/cups.sock, no browsing, every local
+//                      request allowed) and the real tools at the library's
+//                      paths: exec wrappers "/usr/bin/lpadmin", "cupsenable",
+//                      "cupsdisable" (Debian keeps them in /usr/sbin) and
+//                      "/usr/bin/lpstat" (a wrapper of the copy kLpstat).  A
+//                      test may place fakes there; the next Start() undoes it.
+//   RemoveAllQueues()  empty queue list for the next test of the suite.
+// Free functions:
+//   Queue(name)        CUPS's own view of a queue through lpstat: exists,
+//                      enabled, device URI, location.
+//   Tool(argv)         run a program, its standard output (exit status via
+//                      the optional second argument).
 //
-// Start() and Configure() also put the real tools back at the library's
-// paths, so a test may place fakes there (PlaceProgram) and the next
-// SetUp() undoes them; "/usr/bin/lpstat" becomes a wrapper of a copy of the
-// real one (kLpstat), which the fixture itself uses.
-//
-// Queue() asks CUPS itself, through lpstat, for a queue's state and device
-// URI; Tool() runs any program and returns its standard output.
-//
-// Only the real CUPS client tools are used; nothing here goes through the
-// library.  Waiting uses poll(), which the sandbox does not count as a
-// library sleep.
+// Only the real CUPS tools are used; nothing here goes through the library.
+// Waiting uses poll(), which the sandbox does not count as a library sleep.
 #pragma once
 
 #include <dirent.h>
