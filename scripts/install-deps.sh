@@ -16,6 +16,9 @@ if [ "$(id -u)" -ne 0 ]; then
     exit 1
 fi
 
+# snmp-mibs-downloader is left out on purpose: it fetches the MIBs from the
+# network at install time.  The tests hand snmpwalk the few MIB definitions
+# they use.
 PACKAGES="cmake ninja-build g++ pkg-config libgtest-dev libgmock-dev libsodium-dev
 samba-common-bin iproute2 iputils-ping
 cups cups-client cups-bsd

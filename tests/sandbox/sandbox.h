@@ -12,7 +12,8 @@
 // Before every test the writable layers are made fresh again, unless the
 // suite asked for one sandbox for all its tests (XAVO_SANDBOX_PER_SUITE).
 // The renewal runs after SetUpTestSuite() of an ordinary suite, so a suite
-// that prepares files or starts daemons there must be a per-suite one.
+// that prepares files or starts daemons there must be a per-suite one; and
+// whatever a global test environment places is gone by the first test.
 //
 // What a fresh sandbox holds besides the host's files: /run/lock,
 // /run/xavosdk/lock (the SDK's lock directory), /usr/xavo/etc, and
@@ -37,16 +38,23 @@
 // SetRealSleep(true).  Only the two functions are replaced:
 // clock_nanosleep and nanosleep stay real.
 //
-// Children: a forked child shares the sleep records, the usblp devices and
-// the log capture with its test (it logs to the same /dev/log).  A program
-// exec'd by a test is a new image and sees none of the interposers, unless
-// run with LD_PRELOAD of the xavo_usblp_preload library built beside the
-// tests, which joins the same shared state.
+// Children: a forked child shares the sleep records and the usblp devices
+// with its test.  A program exec'd by a test is a new image and sees none
+// of the interposers, unless run with LD_PRELOAD of the xavo_usblp_preload
+// library built beside the tests, which joins the same shared state.
+// Every process of the sandbox logs to the same /dev/log, so daemons a
+// test starts (cupsd, snmpd) add their own lines to TakeLogs().
 //
 // Processes: this process is the subreaper of everything started inside
-// the sandbox.  Processes still running (or unreaped) after a test are
-// named on stderr, and those left at the end of the run are stopped by
-// their ids.  Descendants() lets a test check that a call left nothing.
+// the sandbox.  Processes still running after a test are named on stderr,
+// and those left at the end of the run are stopped by their ids.
+// Descendants() lets a test check that a call left nothing, zombies
+// included.
+//
+// The executable must run as root (namespaces, mounts); otherwise it stops
+// at once with exit code 70 rather than run a test on the host.  A death
+// test that re-executes the binary joins the sandbox it runs in and renews
+// nothing.
 #pragma once
 
 #include <sys/types.h>
