@@ -1,6 +1,7 @@
 // Files and locks: existence, temporary files, lock files, and the
 // appliance-wide named locks.
 #include <fcntl.h>
+#include <pthread.h>
 #include <sys/file.h>
 #include <sys/stat.h>
 #include <time.h>
@@ -55,10 +56,30 @@ struct HeldLocks {
     std::mutex mutex;
     std::map<uint32_t, int> fds;
 };
-HeldLocks &Held() {
-    static HeldLocks held;
-    return held;
+HeldLocks &Held();
+
+// A child forked by the host does not hold the locks of its parent: it
+// forgets them (closing its copies of the descriptors, which leaves the
+// parent's locks in place) instead of believing it holds them.
+void BeforeFork() { Held().mutex.lock(); }
+void AfterForkParent() { Held().mutex.unlock(); }
+void AfterForkChild() {
+    HeldLocks &held = Held();
+    for (auto &[id, fd] : held.fds) ::close(fd);
+    held.fds.clear();
+    held.mutex.unlock();
 }
+
+HeldLocks &Held() {
+    static HeldLocks *held = [] {
+        static HeldLocks locks;
+        pthread_atfork(BeforeFork, AfterForkParent, AfterForkChild);
+        return &locks;
+    }();
+    return *held;
+}
+// Registered when the library is loaded, before the host can fork.
+[[maybe_unused]] const bool kForkHandlers = (Held(), true);
 
 // mkdir -p of the lock file's directory.
 bool MakeParentDirs(const std::string &path) {

@@ -47,7 +47,8 @@ bool Load(const char *szPath, bool bMissingIsEmpty, std::string *pText, int iLin
         case ReadResult::kFailed:
             break;
     }
-    SetError(kErrRead, kUnit, iLine);
+    // Also a symlink or a FIFO planted at the path.
+    SetError(kErrOpen, kUnit, iLine);
     return false;
 }
 

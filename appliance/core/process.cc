@@ -24,6 +24,7 @@
 #include <dirent.h>
 #include <fcntl.h>
 #include <glob.h>
+#include <pthread.h>
 #include <signal.h>
 #include <spawn.h>
 #include <sys/stat.h>
@@ -323,10 +324,38 @@ struct Streams {
     std::mutex mutex;
     std::map<FILE *, pid_t> children;
 };
-Streams &OpenStreams() {
-    static Streams streams;
-    return streams;
+Streams &OpenStreams();
+
+// A child forked by the host has none of its parent's programs for
+// children: it forgets their streams (ORLICPclose could not wait for them)
+// and the SIGCHLD window they held open.
+void BeforeFork() {
+    OpenStreams().mutex.lock();
+    gSignalMutex.lock();
 }
+void AfterForkParent() {
+    gSignalMutex.unlock();
+    OpenStreams().mutex.unlock();
+}
+void AfterForkChild() {
+    if (gSignalChanged) sigaction(SIGCHLD, &gSignalSaved, nullptr);
+    gSignalChanged = false;
+    gSignalUsers = 0;
+    gSignalMutex.unlock();
+    OpenStreams().children.clear();
+    OpenStreams().mutex.unlock();
+}
+
+Streams &OpenStreams() {
+    static Streams *streams = [] {
+        static Streams s;
+        pthread_atfork(BeforeFork, AfterForkParent, AfterForkChild);
+        return &s;
+    }();
+    return *streams;
+}
+// Registered when the library is loaded, before the host can fork.
+[[maybe_unused]] const bool kForkHandlers = (OpenStreams(), true);
 
 bool IsDigits(const char *sz) {
     if (*sz == '\0') return false;
