@@ -12,6 +12,7 @@
 #include <map>
 #include <string>
 
+#include "support/fault_sweep.h"
 #include "support/logs.h"
 #include "xavoprinter.h"
 
@@ -311,6 +312,49 @@ TEST(PrinterConfSetup, ConcurrentProcessesLoseNothing) {
     for (int p = 0; p < kProcesses; ++p) {
         EXPECT_EQ(shared[sharedKeys[p]], "v" + std::to_string(p)) << sharedKeys[p];
     }
+}
+
+}  // namespace
+
+namespace {
+
+// Every platform call of a setup failed in turn: the setup fails cleanly
+// (its own code or the platform's), or carries on where a failure is
+// harmless, and never leaves the printer lock held.
+TEST(PrinterConfSetup, EachPlatformFailureFailsCleanly) {
+    xavo::test::SweepFailures(
+        [] { WriteSection(kPrinter, kStored); },
+        [] {
+            UsbPrinterConf conf = Record(kPrinter);
+            std::strcpy(conf.szProducer, "New");
+            return XAVOPrinterConfSetup(&conf, 0);
+        },
+        [](const std::string &failed, int32_t result) {
+            if (failed == "ORLICFileGetSection" || failed == "ORLICFileLockByFile") {
+                // An unreadable old section is set up from the record alone;
+                // a busy lock is tried again.
+                EXPECT_EQ(result, 0);
+            } else {
+                EXPECT_LT(result, 0);
+                EXPECT_THAT(ORLICErrGet(), ::testing::AnyOf(xavo::test::kInjectedCode, ERR_OUT_OF_MEMORY));
+            }
+            int fd = XAVOPrinterPrinterConfLock();
+            EXPECT_GE(fd, 0) << "the printer lock was left held";
+            XAVOPrinterPrinterConfUnlock(fd);
+        });
+}
+
+TEST(PrinterCupsNameGet, PlatformFailureIsReportedWithThePlatformsCode) {
+    xavo::test::SweepFailures(
+        [] { WriteSection(kPrinter, kStored); },
+        [] {
+            char szName[32];
+            return XAVOPrinterCupsNameGet(kPrinter, szName, sizeof szName);
+        },
+        [](const std::string &, int32_t result) {
+            EXPECT_EQ(result, -1);
+            EXPECT_EQ(ORLICErrGet(), xavo::test::kInjectedCode);
+        });
 }
 
 }  // namespace

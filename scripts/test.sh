@@ -1,0 +1,34 @@
+#!/usr/bin/env bash
+# Builds libxavoprinter and runs its whole test suite twice: once plainly and
+# once under AddressSanitizer, UndefinedBehaviorSanitizer and LeakSanitizer.
+# Run as root on Debian 12: it installs what it needs with apt-get, and the
+# tests enter private mount and network namespaces (they never touch the
+# host's files or network).
+set -euo pipefail
+cd "$(dirname "$0")/.."
+
+if [ "$(id -u)" -ne 0 ]; then
+  echo "scripts/test.sh must run as root (the test sandbox uses namespaces)" >&2
+  exit 2
+fi
+
+bash scripts/install-deps.sh
+
+jobs=$(nproc)
+status=0
+for variant in plain asan; do
+  dir=build/$variant
+  opts=(-DCMAKE_BUILD_TYPE=RelWithDebInfo)
+  [ "$variant" = asan ] && opts=(-DCMAKE_BUILD_TYPE=Debug -DXAVO_SANITIZE=ON)
+  echo "== $variant: configure and build"
+  cmake -S . -B "$dir" -G Ninja "${opts[@]}" >/dev/null
+  cmake --build "$dir" -j "$jobs"
+  echo "== $variant: test"
+  # Every test executable runs in namespaces of its own, so they can run
+  # side by side.
+  if ! ASAN_OPTIONS=detect_leaks=1:abort_on_error=0 UBSAN_OPTIONS=print_stacktrace=1 \
+       ctest --test-dir "$dir" --output-on-failure -j "$jobs"; then
+    status=1
+  fi
+done
+exit $status
