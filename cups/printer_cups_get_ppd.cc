@@ -1,5 +1,6 @@
 #include <cstdio>
 
+#include "cups/queue_create.h"
 #include "internal/boundary.h"
 #include "internal/guards.h"
 #include "internal/log.h"
@@ -7,7 +8,6 @@
 
 namespace {
 constexpr char kUnit[] = "printer_cups_get_ppd";
-constexpr char kPpdPathFormat[] = "/etc/cups/ppd/%s.ppd";
 constexpr int kPathSize = 388;
 }  // namespace
 
@@ -18,7 +18,7 @@ XAVO_EXPORT char *XAVOCupsGetPPD(const char *szPpdName) noexcept {
             return nullptr;
         }
         char szPath[kPathSize] = {};
-        std::snprintf(szPath, sizeof szPath, kPpdPathFormat, szPpdName);
+        std::snprintf(szPath, sizeof szPath, xavo::kPpdPathFormat, szPpdName);
         xavo::File file(std::fopen(szPath, "r"));
         if (!file) {
             XSETERR(ERR_OPEN);

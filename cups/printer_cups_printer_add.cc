@@ -20,9 +20,7 @@ constexpr char kLogAdded[] = "%s:%d add cups printer=%s, ok";
 constexpr char kLogDisableFailed[] = "%s:%d disable printer=%s failed";
 
 constexpr char kQueueNameFormat[] = "usbprinter%d";
-constexpr char kFirstQueue[] = "usbprinter1";
 constexpr char kSecondQueue[] = "usbprinter2";
-constexpr char kAliasQueue[] = "usbprinter";
 constexpr char kDeviceUriFormat[] = "usb:/dev/usb/%s";
 constexpr int kNameSize = 64;
 constexpr int kDeviceUriSize = 4096;
@@ -34,7 +32,7 @@ class FreeNameRule final : public xavo::QueueListRule {
 public:
     bool Begin(const FILE *) override { return true; }
     bool Line(const char *szLine) override {
-        if (!bFirstUsed && std::strstr(szLine, kFirstQueue) != nullptr) {
+        if (!bFirstUsed && std::strstr(szLine, xavo::kFirstUsbQueue) != nullptr) {
             bFirstUsed = true;
         } else if (!bSecondUsed && std::strstr(szLine, kSecondQueue) != nullptr) {
             bSecondUsed = true;
@@ -120,14 +118,14 @@ XAVO_EXPORT int32_t XAVOPrinterCupsAdd(const char *szPrinterId, const char *szPp
         for (int iPass = 0; iPass < 2; ++iPass) {
             if (iPass == 1) {
                 lpadmin.DropPpd();
-                if (!lpadmin.SetQueue(kAliasQueue, kUnit, __LINE__)) return -1;
-                szQueue = kAliasQueue;
+                if (!lpadmin.SetQueue(xavo::kUsbQueueAlias, kUnit, __LINE__)) return -1;
+                szQueue = xavo::kUsbQueueAlias;
             }
             if (!lpadmin.Run(kUnit)) return -1;
             XLOG(LOG_ERR, kLogAdded, szQueue);
             // Created accepting jobs; held until the appliance enables it.
             if (XAVOPrinterCupsPrinterEnable(szQueue, 0) < 0) XLOG(LOG_ERR, kLogDisableFailed, szPrinterId);
-            if (iPass == 0 && std::strstr(szQueue, kFirstQueue) == nullptr) break;
+            if (iPass == 0 && std::strstr(szQueue, xavo::kFirstUsbQueue) == nullptr) break;
         }
         return 0;
     });

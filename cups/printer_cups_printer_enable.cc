@@ -3,6 +3,7 @@
 
 #include <cstdio>
 
+#include "cups/queue_create.h"
 #include "internal/boundary.h"
 #include "internal/log.h"
 #include "internal/text.h"
@@ -13,8 +14,6 @@ constexpr char kUnit[] = "printer_cups_printer_enable";
 constexpr char kLogRunFailed[] = "%s:%d run cmd failed, cmd=[%s %s], ret=%d";
 constexpr char kCupsEnablePath[] = "/usr/bin/cupsenable";
 constexpr char kCupsDisablePath[] = "/usr/bin/cupsdisable";
-constexpr char kAliasedQueue[] = "usbprinter1";
-constexpr char kAliasQueue[] = "usbprinter";
 constexpr int kNameSize = 128;
 constexpr int kCommandSize = 256;
 }  // namespace
@@ -29,9 +28,9 @@ XAVO_EXPORT int32_t XAVOPrinterCupsPrinterEnable(const char *szCupsPrinterName, 
         xavo::CopyText(szName, szCupsPrinterName);
         // The alias follows "usbprinter1" however the caller spells it; it
         // is tried only after the queue itself was switched.
-        bool bAlias = strcasecmp(szCupsPrinterName, kAliasedQueue) == 0;
+        bool bAlias = strcasecmp(szCupsPrinterName, xavo::kFirstUsbQueue) == 0;
         for (int iPass = 0; iPass < (bAlias ? 2 : 1); ++iPass) {
-            if (iPass == 1) xavo::CopyText(szName, kAliasQueue);
+            if (iPass == 1) xavo::CopyText(szName, xavo::kUsbQueueAlias);
             char szCommand[kCommandSize] = {};
             std::snprintf(szCommand, sizeof szCommand, "%s", blEnable != 0 ? kCupsEnablePath : kCupsDisablePath);
             int32_t iResult = ORLICExec(szCommand, szName, nullptr, nullptr, nullptr);

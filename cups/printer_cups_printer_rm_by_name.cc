@@ -2,6 +2,7 @@
 
 #include <cstring>
 
+#include "cups/queue_create.h"
 #include "internal/boundary.h"
 #include "internal/log.h"
 #include "xavoprinter.h"
@@ -9,15 +10,12 @@
 namespace {
 constexpr char kUnit[] = "printer_cups_printer_rm_by_name";
 constexpr char kLogExecFailed[] = "%s:%d Execute error, cmd=%s -x %s";
-constexpr char kLpadminPath[] = "/usr/bin/lpadmin";
-constexpr char kAliasedQueue[] = "usbprinter1";
-constexpr char kAliasQueue[] = "usbprinter";
 
 // lpadmin's own refusals (no such queue) are not failures of the removal:
 // only a runner that could not run the tool is.
 bool RemoveQueue(const char *szName) {
-    if (ORLICExec(kLpadminPath, "-x", szName, nullptr, nullptr) >= 0) return true;
-    XLOG(LOG_ERR, kLogExecFailed, kLpadminPath, szName);
+    if (ORLICExec(xavo::kLpadminPath, "-x", szName, nullptr, nullptr) >= 0) return true;
+    XLOG(LOG_ERR, kLogExecFailed, xavo::kLpadminPath, szName);
     return false;
 }
 }  // namespace
@@ -31,7 +29,7 @@ XAVO_EXPORT int32_t XAVOPrinterCupsRmByName(const char *szCupsPrinterName) noexc
         if (!RemoveQueue(szCupsPrinterName)) return -1;
         // Unlike enabling, removal matches the name exactly: only the queue
         // the library itself named "usbprinter1" owns the alias.
-        if (std::strcmp(szCupsPrinterName, kAliasedQueue) == 0 && !RemoveQueue(kAliasQueue)) return -1;
+        if (std::strcmp(szCupsPrinterName, xavo::kFirstUsbQueue) == 0 && !RemoveQueue(xavo::kUsbQueueAlias)) return -1;
         return 0;
     });
 }

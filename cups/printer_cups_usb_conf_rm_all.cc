@@ -3,6 +3,7 @@
 #include <cstdio>
 #include <cstring>
 
+#include "cups/queue_create.h"
 #include "internal/boundary.h"
 #include "internal/guards.h"
 #include "internal/log.h"
@@ -11,7 +12,6 @@
 namespace {
 constexpr char kUnit[] = "printer_cups_usb_conf_rm_all";
 constexpr char kLogAlive[] = "%s:%d skip remove printer, %s alive. [0x%04X %s:%d]";
-constexpr char kSchedulerService[] = "cupsd";
 constexpr char kPrintersConf[] = "/etc/cups/printers.conf";
 constexpr char kTempTemplate[] = "/etc/cups/printers.conf.XXXXXX";
 constexpr char kBlockEnd[] = "</Printer>";
@@ -39,9 +39,9 @@ XAVO_EXPORT int32_t XAVOPrinterCupsUsbConfRmAll(void) noexcept {
     return XAVO_BOUNDARY(-1, [&] {
         // cupsd rewrites the file from memory whenever its queues change,
         // which would undo the edit or interleave with it.
-        if (ORLIServiceIsRunning(kSchedulerService) == 1) {
+        if (ORLIServiceIsRunning(xavo::kSchedulerService) == 1) {
             XSETERR(ERR_SERVICE_RUNNING);
-            XLOG(LOG_ERR, kLogAlive, kSchedulerService, XERR_TAIL);
+            XLOG(LOG_ERR, kLogAlive, xavo::kSchedulerService, XERR_TAIL);
             return -1;
         }
         if (ORLICFileExist(kPrintersConf) == 0) return 0;

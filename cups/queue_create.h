@@ -1,7 +1,8 @@
-// What the creation of a USB queue and of a network queue share: the
-// scheduler that must run, the PPD file to install, the lpadmin argument
-// vector and its runner.  Messages are logged under the calling unit's
-// name, as the appliance's log readers expect.
+// What the CUPS queue units share: the scheduler, the tools' paths, the
+// library's own USB queue names, and for the creation of USB and network
+// queues the PPD file to install, the lpadmin argument vector and its
+// runner.  Messages are logged under the calling unit's name, as the
+// appliance's log readers expect.
 #pragma once
 
 #include <cstdint>
@@ -14,6 +15,10 @@ inline constexpr char kSchedulerService[] = "cupsd";
 inline constexpr char kLpadminPath[] = "/usr/bin/lpadmin";
 inline constexpr char kPpdDir[] = "/etc/cups/ppd/";
 inline constexpr char kPpdPathFormat[] = "/etc/cups/ppd/%s.ppd";
+// The first USB queue and its alias, which is made, switched and removed
+// with it.
+inline constexpr char kFirstUsbQueue[] = "usbprinter1";
+inline constexpr char kUsbQueueAlias[] = "usbprinter";
 
 // Makes sure "cupsd" runs, starting it when it does not; false (logged)
 // when it cannot be started.
