@@ -198,7 +198,7 @@ XAVO_PLATFORM_API int32_t ORLICCryptSzDecrypt(const char *szCipher, char *szOut,
     szOut[0] = '\0';
     return XAVO_GUARD(int32_t{0}, [&] {
         size_t len = std::strlen(szCipher);
-        std::vector<unsigned char> box(len);  // decoded is shorter than its text
+        std::vector<unsigned char> box(len + 1);  // decoded is shorter than its text
         size_t sealed = 0;
         if (sodium_base642bin(box.data(), box.size(), szCipher, len, nullptr, &sealed, nullptr, kBase64) != 0 ||
             sealed < kOverhead) {
