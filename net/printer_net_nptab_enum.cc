@@ -1,13 +1,13 @@
 // Lists the network printer IDs of the network printer table.
 #include <syslog.h>
 
-#include <algorithm>
 #include <cstdio>
 #include <cstring>
 #include <string>
 
 #include "internal/boundary.h"
 #include "internal/guards.h"
+#include "internal/line_reader.h"
 #include "internal/log.h"
 #include "net/net_paths.h"
 #include "xavoprinter.h"
@@ -21,30 +21,11 @@ constexpr char kLogIdFailed[] = "%s:%d Failed to get network printer ID.[0x%04X 
 constexpr char kFieldDelimiters[] = "=\"";
 constexpr char kIdFormat[] = "%s-%s";
 constexpr int32_t kListCapacity = 1024;
-constexpr int kReadBufferSize = 1024;
 // Fields of a line: address, the empty field between "=" and the quote,
 // name, then the rest of the line.
 constexpr int kAddressField = 0;
 constexpr int kNameField = 2;
 constexpr int kMinFields = 3;
-// Longest line kept whole.  An address and a name that need more than this
-// cannot fit a printer ID anyway, so whatever a longer line cuts off is
-// either beyond its closing quote or makes the ID too long all the same.
-constexpr size_t kMaxLine = 4 * xavo::kNetPrinterIdSize;
-
-// Reads one line whole, newline included, into line.  A line longer than
-// the read buffer is not taken as several lines: its tail would be listed
-// as printers of its own.  false at the end of the file.
-bool ReadTableLine(FILE *pFile, std::string &line) {
-    line.clear();
-    char szPiece[kReadBufferSize];
-    while (std::fgets(szPiece, sizeof szPiece, pFile) != nullptr) {
-        const size_t n = std::strlen(szPiece);
-        if (line.size() < kMaxLine) line.append(szPiece, std::min(n, kMaxLine - line.size()));
-        if (n > 0 && szPiece[n - 1] == '\n') return true;
-    }
-    return !line.empty();
-}
 
 // Appends the printer ID of one table line; false on a bad line, logged.
 bool ListLine(const std::string &line, ORLICSzList **ppList) {
@@ -67,12 +48,12 @@ bool ListLine(const std::string &line, ORLICSzList **ppList) {
     }
     const char *szAddress = xavo::ListItem(fields.get(), kAddressField);
     const char *szName = xavo::ListItem(fields.get(), kNameField);
-    if (std::strlen(szAddress) + std::strlen(szName) + 2 > xavo::kNetPrinterIdSize) {
+    // The ID must fit with its NUL: address, hyphen and name in 1024 bytes.
+    char szId[xavo::kNetPrinterIdSize];
+    if (std::snprintf(szId, sizeof szId, kIdFormat, szAddress, szName) >= static_cast<int>(sizeof szId)) {
         XSETERR(ERR_BUF_TOO_SMALL);
         return false;
     }
-    char szId[xavo::kNetPrinterIdSize];
-    std::snprintf(szId, sizeof szId, kIdFormat, szAddress, szName);
     fields.reset();
     ORLICSzListPush(ppList, szId);
     return true;
@@ -89,8 +70,12 @@ XAVO_EXPORT int32_t XAVOPrinterNetNptabEnum(ORLICSzList **ppList) noexcept {
             XSETERR(ERR_OPEN);
             return 0;
         }
+        // Lines are read whole, however long: a line cut at a read buffer
+        // would list its tail as a printer of its own, and an address and
+        // name too long for an ID must fail as such.  A regular file's read
+        // is never interrupted by a signal.
         std::string line;
-        while (ReadTableLine(table.get(), line)) {
+        while (xavo::ReadLine(table.get(), line) == xavo::ReadStatus::kLine) {
             if (line.empty() || line == "\n") continue;
             // One bad line ends the listing; the IDs before it stay listed.
             if (!ListLine(line, ppList)) {
