@@ -143,7 +143,10 @@ bool ReplaceFile(const char *szPath, std::string_view content, Failure *pFailure
     }
 
     // Same directory, so that the rename stays within one file system and
-    // is atomic; hidden, so that directory listings do not pick it up.
+    // is atomic; hidden, so that directory listings do not pick it up.  A
+    // writer killed before the rename leaves its temporary file behind; it
+    // is not cleaned up later because nobody can tell it from the one a
+    // live writer is filling.
     std::string tmpl = DirName(path) + "/." + BaseName(path) + ".XXXXXX";
     OwnedFd fd(::mkostemp(tmpl.data(), O_CLOEXEC));
     if (fd.get() < 0) {
