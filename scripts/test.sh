@@ -24,9 +24,9 @@ for variant in plain asan; do
   cmake -S . -B "$dir" -G Ninja "${opts[@]}" >/dev/null
   cmake --build "$dir" -j "$jobs"
   echo "== $variant: test"
-  # One suite at a time: each runs in namespaces of its own, but the
-  # process table is the machine's, and a suite that needs the scheduler
-  # stopped must not see another suite's cupsd.  The whole run takes seconds.
+  # One suite at a time: each runs in namespaces of its own, but several
+  # start real daemons and time signals against real programs, which a
+  # loaded machine would only make slower to judge.  The run takes seconds.
   if ! ASAN_OPTIONS=detect_leaks=1:abort_on_error=0 UBSAN_OPTIONS=print_stacktrace=1 \
        ctest --test-dir "$dir" --output-on-failure -j 1; then
     status=1

@@ -377,6 +377,15 @@ bool ProcessAlive(std::string_view name) {
     // The kernel keeps 15 characters of a command name.
     constexpr size_t kCommLen = 15;
     name = name.substr(0, kCommLen);
+    // A service counts as running for the caller only when it works on the
+    // caller's files: a daemon in another mount namespace (a container, a
+    // test sandbox) keeps its own /etc/cups and its own spool, and is no
+    // use to us.
+    // Looking through /proc meets processes we may not inspect (EACCES):
+    // that is no failure of ours, and the caller's errno is left alone.
+    const int savedErrno = errno;
+    struct stat ownMounts {};
+    const bool bKnowOwnMounts = ::stat("/proc/self/ns/mnt", &ownMounts) == 0;
     DIR *proc = ::opendir("/proc");
     if (proc == nullptr) return false;
     bool bFound = false;
@@ -385,6 +394,14 @@ bool ProcessAlive(std::string_view name) {
         dirent *e = ::readdir(proc);
         if (e == nullptr) break;
         if (!IsDigits(e->d_name)) continue;
+        if (bKnowOwnMounts) {
+            struct stat mounts {};
+            std::string ns = std::string("/proc/") + e->d_name + "/ns/mnt";
+            if (::stat(ns.c_str(), &mounts) != 0 || mounts.st_ino != ownMounts.st_ino ||
+                mounts.st_dev != ownMounts.st_dev) {
+                continue;
+            }
+        }
         std::string path = std::string("/proc/") + e->d_name + "/stat";
         if (xavo::platform::ReadTextFile(path.c_str(), &stat) != ReadResult::kOk) continue;
         // "pid (comm) state ...": the name may hold ")" itself, so it ends
@@ -398,6 +415,7 @@ bool ProcessAlive(std::string_view name) {
         bFound = std::string_view(stat).substr(open + 1, close - open - 1) == name && state != 'Z' && state != 'X';
     }
     ::closedir(proc);
+    errno = savedErrno;
     return bFound;
 }
 

@@ -16,9 +16,6 @@
 //                      wait until it is gone; cupsd writes printers.conf on
 //                      its way out.
 //   Pid()              this sandbox's scheduler (same mount namespace), or 0.
-//   OthersRunning()    a scheduler of another sandbox runs: the platform's
-//                      ORLIServiceIsRunning("cupsd") looks machine-wide, so a
-//                      test that needs "cupsd" stopped skips then.
 //   Configure()        the private /etc/cups/cupsd.conf (only the domain
 //                      socket /run/cups/cups.sock, no browsing, every local
 //                      request allowed) and the real tools at the library's
@@ -151,17 +148,14 @@ public:
                 waitpid(pid, nullptr, WNOHANG);
                 poll(nullptr, 0, 10);
             }
-            waitpid(pid, nullptr, WNOHANG);
+            // A child of ours may only now have become a zombie: reap it
+            // (0 = not yet; anything else = reaped, or not our child).
+            for (int i = 0; i < 100 && waitpid(pid, nullptr, WNOHANG) == 0; ++i) poll(nullptr, 0, 10);
         }
     }
 
     // The scheduler running in this sandbox (its mount namespace), or 0.
     static pid_t Pid() { return Find(true); }
-
-    // Whether a scheduler runs outside this sandbox (another suite's, run
-    // at the same time).  The platform looks for "cupsd" machine-wide, so a
-    // test that needs it stopped cannot run meanwhile and skips.
-    static bool OthersRunning() { return Find(false) > 0; }
 
     // Writes the scheduler's private configuration and puts the real tools
     // back at the library's paths (replacing fakes a test placed there),
