@@ -20,12 +20,12 @@ std::optional<std::string> ParseArgs(const std::vector<std::string> &words, cons
                 name = w.substr(0, eq);
                 inlineValue = w.substr(eq + 1);
             }
-            const OptionSpec *spec = nullptr;
+            const OptionSpec *known = nullptr;
             for (const OptionSpec &o : allowed) {
-                if (o.name == name) spec = &o;
+                if (o.name == name) known = &o;
             }
-            if (spec == nullptr) return "unknown option " + name;
-            if (!spec->bTakesValue) {
+            if (known == nullptr) return "unknown option " + name;
+            if (!known->bTakesValue) {
                 if (inlineValue) return name + " takes no value";
                 out.options[name] = "";
             } else if (inlineValue) {
