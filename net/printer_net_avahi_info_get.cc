@@ -82,6 +82,7 @@ XAVO_EXPORT int32_t XAVOPrinterNetAvahiInfoGet(const char *szIP, NetPrinterInfo 
             !XARG_OK(pNPInfo != nullptr, "NULL != pNPInfo")) {
             return -1;
         }
+        const int iCallerErrno = errno;
         // The daemon is started on demand; a browse without it simply finds
         // nothing, which the result then says.
         if (ORLICIsProcAlive(kAvahiDaemon) <= 0) ORLIServiceStart(kAvahiService, 0);
@@ -102,6 +103,9 @@ XAVO_EXPORT int32_t XAVOPrinterNetAvahiInfoGet(const char *szIP, NetPrinterInfo 
             errno = 0;
             return -1;
         }
+        // Starting the tool may have changed errno: what is kept is the
+        // caller's own value.
+        errno = iCallerErrno;
         keepErrno.emplace();
 
         // The last TXT record seen for the address on each known port.

@@ -75,6 +75,7 @@ XAVO_EXPORT int32_t XAVOPrinterNetGetStringBackend(const char *szIP, char *szBac
         }
         // The caller's errno is kept once the tool runs; it outlives the
         // pipe so that the close cannot change it either.
+        const int iCallerErrno = errno;
         std::optional<xavo::ErrnoKeeper> keepErrno;
         xavo::Pipe walk(xavo::StartSnmpWalk(szIP));
         if (!walk) {
@@ -82,6 +83,9 @@ XAVO_EXPORT int32_t XAVOPrinterNetGetStringBackend(const char *szIP, char *szBac
             errno = 0;
             return -1;
         }
+        // Starting the tool may have changed errno: what is kept is the
+        // caller's own value.
+        errno = iCallerErrno;
         keepErrno.emplace();
 
         char szLine[xavo::kSnmpLineBuffer] = {};

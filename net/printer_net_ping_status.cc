@@ -28,6 +28,7 @@ XAVO_EXPORT int32_t XAVOPrinterNetPingStatus(const char *szIP, char *szStatus, i
             !XARG_OK(0 < cbStatus, "0 < cbStatus")) {
             return -1;
         }
+        const int iCallerErrno = errno;
         std::optional<xavo::ErrnoKeeper> keepErrno;  // outlives the pipe's close
         xavo::Pipe ping(ORLICPopen(kPingPath, "r", "-w", kPingDeadline, szIP, nullptr));
         if (!ping) {
@@ -36,6 +37,9 @@ XAVO_EXPORT int32_t XAVOPrinterNetPingStatus(const char *szIP, char *szStatus, i
             return -1;
         }
         xavo::CopyText(szStatus, cbStatus, kStatusOffline);
+        // Starting the tool may have changed errno: what is kept is the
+        // caller's own value.
+        errno = iCallerErrno;
         keepErrno.emplace();
 
         char szLine[kLineBuffer] = {};

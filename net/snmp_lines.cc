@@ -8,7 +8,7 @@ namespace xavo {
 
 namespace {
 
-constexpr std::array<std::string_view, 3> kManufacturerKeys = {"MANUFACTURER:", "MFG:", "MFR:"};
+constexpr std::array<std::string_view, 3> kSnmpManufacturerKeys = {"MANUFACTURER:", "MFG:", "MFR:"};
 constexpr std::array<std::string_view, 2> kModelKeys = {"MODEL:", "MDL:"};
 constexpr std::string_view kValueMarker = "STRING: \"";
 constexpr std::string_view kUriMark = "://";
@@ -36,7 +36,7 @@ bool EqualsNoCase(std::string_view a, std::string_view b) {
 }  // namespace
 
 SnmpDeviceId SnmpDeviceIdFromLine(std::string_view line) {
-    if (line.empty() || !HoldsAny(line, kManufacturerKeys) || !HoldsAny(line, kModelKeys)) return {};
+    if (line.empty() || !HoldsAny(line, kSnmpManufacturerKeys) || !HoldsAny(line, kModelKeys)) return {};
     size_t marker = line.find(kValueMarker);
     if (marker == std::string_view::npos) return {};
     std::string_view after = line.substr(marker + kValueMarker.size());

@@ -1,0 +1,425 @@
+// Network identification: the one-line readers of each tool's output from
+// tables of lines the real tools printed, then the operations against the
+// real ping and snmpd of the sandbox's loopback network and against fake
+// tools that print what the real ones print.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <cerrno>
+#include <cstring>
+#include <memory>
+#include <string>
+
+#include "sandbox/sandbox.h"
+#include "support/logs.h"
+#include "support/snmpd.h"
+#include "xavoprinter.h"
+
+// The readers are internal to the library: compiled into this suite.
+#include "net/avahi_lines.cc"
+#include "net/bjnp_lines.cc"
+#include "net/ping_lines.cc"
+#include "net/snmp_lines.cc"
+
+using ::testing::ElementsAre;
+using ::testing::IsEmpty;
+using namespace xavo;
+using namespace xavo::test;
+
+namespace {
+
+// The library's own lines: daemons started in the sandbox log there too.
+std::vector<std::string> LibraryLogs() {
+    std::vector<std::string> out;
+    for (const std::string &line : Logs()) {
+        if (line.find(" printer_net_") != std::string::npos) out.push_back(line);
+    }
+    return out;
+}
+
+// ---- snmpwalk lines (recorded from snmpwalk 5.9.3 against snmpd) ----
+struct SnmpIdCase {
+    const char *szLine;
+    SnmpIdKind kind;
+    const char *szValue;
+};
+const SnmpIdCase kSnmpIdCases[] = {
+    {"SNMPv2-SMI::enterprises.99999.1.1.0 = STRING: \"MFG:ACME;CMD:PCL,PJL;MDL:LaserJet 100;CLS:PRINTER;\"",
+     SnmpIdKind::kValue, "MFG:ACME;CMD:PCL,PJL;MDL:LaserJet 100;CLS:PRINTER;"},
+    {"SNMPv2-SMI::enterprises.99999.1.1.0 = STRING: \"MODEL:X;MANUFACTURER:Y;\"", SnmpIdKind::kValue,
+     "MODEL:X;MANUFACTURER:Y;"},
+    {"SNMPv2-SMI::enterprises.99999.1.1.0 = \"MFG:ACME;MDL:LX;\"", SnmpIdKind::kNone, ""},
+    {"SNMPv2-SMI::enterprises.99999.1.1.0 = STRING: \"mfg:acme;mdl:lx;\"", SnmpIdKind::kNone, ""},
+    {"SNMPv2-SMI::enterprises.99999.1.1.0 = STRING: \"MFG:ACME;CMD:PCL;\"", SnmpIdKind::kNone, ""},
+    {"SNMPv2-SMI::enterprises.99999.1.1.0 = STRING: \"MFG:ACME;MDL:cut short", SnmpIdKind::kValue,
+     "MFG:ACME;MDL:cut shor"},
+    {"MFG: MDL: STRING: \"", SnmpIdKind::kCutShort, ""},
+    {"SNMPv2-SMI::enterprises.99999.1.3.0 = INTEGER: 42", SnmpIdKind::kNone, ""},
+    {"End of MIB", SnmpIdKind::kNone, ""},
+    {"", SnmpIdKind::kNone, ""},
+};
+
+TEST(SnmpLines, DeviceIdLinesNeedBothKeysAndTheValueMarker) {
+    for (const SnmpIdCase &c : kSnmpIdCases) {
+        SnmpDeviceId id = SnmpDeviceIdFromLine(c.szLine);
+        EXPECT_EQ(id.kind, c.kind) << c.szLine;
+        EXPECT_EQ(std::string(id.value), c.szValue) << c.szLine;
+    }
+}
+
+struct SnmpUriCase {
+    const char *szLine;
+    SnmpUriKind kind;
+    const char *szText;
+    SnmpBackend backend;
+    const char *szRest;
+};
+const SnmpUriCase kSnmpUriCases[] = {
+    {"SNMPv2-SMI::enterprises.99999.1.2.0 = STRING: \"LPR://127.0.0.1/lp1\"", SnmpUriKind::kUri,
+     "LPR://127.0.0.1/lp1", SnmpBackend::kLpd, "//127.0.0.1/lp1"},
+    {"x = STRING: \"Lpr://h/q\"", SnmpUriKind::kUri, "Lpr://h/q", SnmpBackend::kLpd, "//h/q"},
+    {"x = STRING: \"lpd://h/q\"", SnmpUriKind::kUri, "lpd://h/q", SnmpBackend::kLpd, "//h/q"},
+    {"x = STRING: \"IPP://h/ipp/print\"", SnmpUriKind::kUri, "IPP://h/ipp/print", SnmpBackend::kScheme,
+     "//h/ipp/print"},
+    {"x = STRING: \"socket://h:9100\"", SnmpUriKind::kUri, "socket://h:9100", SnmpBackend::kScheme, "//h:9100"},
+    {"x = STRING: \"ipps://h/q\"", SnmpUriKind::kUri, "ipps://h/q", SnmpBackend::kUnmapped, "//h/q"},
+    {"x = STRING: \"http://h/\"", SnmpUriKind::kPass, "", SnmpBackend::kUnmapped, ""},
+    {"x = Hex-STRING: 68 74 74 70 3A 2F 2F", SnmpUriKind::kPass, "", SnmpBackend::kUnmapped, ""},
+    {"x = STRING: ipp://no-quote", SnmpUriKind::kBad, "", SnmpBackend::kUnmapped, ""},
+    {"ipp://h = STRING: \"x", SnmpUriKind::kBad, "", SnmpBackend::kUnmapped, ""},
+    {"SNMPv2-SMI::enterprises.99999.1.4.0 = STRING: \"plain text\"", SnmpUriKind::kPass, "",
+     SnmpBackend::kUnmapped, ""},
+};
+
+TEST(SnmpLines, UriLinesAreRecognisedAndMappedToBackends) {
+    for (const SnmpUriCase &c : kSnmpUriCases) {
+        SnmpUri uri = SnmpUriFromLine(c.szLine);
+        EXPECT_EQ(uri.kind, c.kind) << c.szLine;
+        EXPECT_EQ(std::string(uri.text), c.szText) << c.szLine;
+        if (uri.kind != SnmpUriKind::kUri) continue;
+        SnmpUriParts parts = SnmpSplitUri(uri.text);
+        EXPECT_EQ(parts.backend, c.backend) << c.szLine;
+        EXPECT_EQ(std::string(parts.rest), c.szRest) << c.szLine;
+    }
+    EXPECT_EQ(SnmpSplitUri("ipp").backend, SnmpBackend::kUnmapped) << "a bare scheme names no printer";
+}
+
+// ---- ping summaries (iputils) ----
+TEST(PingLines, LossOtherThanTotalIsReachable) {
+    struct {
+        const char *szLine;
+        std::optional<bool> reachable;
+    } const cases[] = {
+        {"1 packets transmitted, 1 received, 0% packet loss, time 0ms", true},
+        {"2 packets transmitted, 1 received, 50% packet loss, time 1001ms", true},
+        {"1 packets transmitted, 0 received, 100% packet loss, time 0ms", false},
+        {"2 packets transmitted, 0 received, +2 errors, 100% packet loss, time 1002ms", false},
+        {"3 packets transmitted, 3 received, +1 duplicates, 0% packet loss, time 2003ms", true},
+        {"100% packet loss", false},
+        {"1 packets transmitted, 100% packet loss", false},
+        {"PING 127.0.0.1 (127.0.0.1) 56(84) bytes of data.", std::nullopt},
+        {"ping: connect: Network is unreachable", std::nullopt},
+    };
+    for (const auto &c : cases) EXPECT_EQ(PingSummaryReachable(c.szLine), c.reachable) << c.szLine;
+}
+
+// ---- avahi-browse -arpt lines (recorded from avahi 0.8 on loopback) ----
+TEST(AvahiLines, PortsAndTxtValues) {
+    EXPECT_EQ(AvahiServiceForPort("8611"), kAvahiBjnp);
+    EXPECT_EQ(AvahiServiceForPort("9100"), kAvahiSocket);
+    EXPECT_EQ(AvahiServiceForPort("515"), kAvahiLpd);
+    EXPECT_EQ(AvahiServiceForPort("631"), kAvahiIpp);
+    EXPECT_EQ(AvahiServiceForPort("80"), std::nullopt);
+    EXPECT_EQ(AvahiServiceForPort("127.0.0.2"), std::nullopt) << "address read as port when TXT is empty";
+    const std::string txt = "\"usb_CMD=PCL,PJL\" \"usb_MDL=Laser 100\" \"usb_MFG=ACME\"";
+    EXPECT_EQ(AvahiTxtValue(txt, "usb_MDL="), "Laser 100");
+    EXPECT_EQ(AvahiTxtValue(txt, "usb_CMD="), "PCL,PJL");
+    EXPECT_EQ(AvahiTxtValue(txt, "usb_DES="), std::nullopt);
+    EXPECT_EQ(AvahiTxtValue("\"usb_MFG=Cut sho", "usb_MFG="), "Cut sho");
+}
+
+// ---- bjnp listing lines (format of the CUPS bjnp backend 2.0.3) ----
+TEST(BjnpLines, MarkersComeFirstAndTheAddressMustMatchWhole) {
+    char szPattern[32];
+    std::string_view pattern = BjnpIpPattern("10.0.0.1", szPattern);
+    EXPECT_EQ(pattern, "/10.0.0.1:8611");
+    const std::string match =
+        "network bjnp://10.0.0.1:8611 \"Canon MX920 series\" \"Canon MX920 series 10.0.0.1\" "
+        "\"MANUFACTURER:Canon;MFG:Canon;MDL:MX920 series;CLS:PRINTER;\"";
+    BjnpLine line = BjnpClassifyLine(match, pattern);
+    EXPECT_EQ(line.kind, BjnpLineKind::kMatch);
+    EXPECT_EQ(line.stringId, "MANUFACTURER:Canon;MFG:Canon;MDL:MX920 series;CLS:PRINTER");
+    EXPECT_EQ(BjnpClassifyLine("network bjnp \"Unknown\" \"Canon network printer\"", pattern).kind,
+              BjnpLineKind::kUnknown);
+    EXPECT_EQ(BjnpClassifyLine("network bjnp://10.0.0.1:8611 \"Unidentified printer\" \"x\"", pattern).kind,
+              BjnpLineKind::kUnidentified);
+    EXPECT_EQ(BjnpClassifyLine("network bjnp://10.0.0.11:8611 \"C\" \"C\" \"MFG:C;MDL:D;\"", pattern).kind,
+              BjnpLineKind::kOther);
+    EXPECT_EQ(BjnpClassifyLine("network bjnp://110.0.0.1:8611 \"C\" \"C\" \"MFG:C;MDL:D;\"", pattern).kind,
+              BjnpLineKind::kOther);
+    BjnpLine noKey = BjnpClassifyLine("network bjnp://10.0.0.1:8611 \"C\" \"C\" \"MDL:D;\"", pattern);
+    EXPECT_EQ(noKey.kind, BjnpLineKind::kMatch);
+    EXPECT_FALSE(noKey.bHasManufacturer);
+}
+
+// ---- the operations ----------------------------------------------------
+
+std::string Listing(const std::string &body) { return "#!/bin/sh\ncat <<'EOF'\n" + body + "EOF\n"; }
+
+constexpr char kBjnp[] = "/usr/lib/cups/backend/bjnp";
+constexpr char kBjnpLine[] =
+    "network bjnp://10.0.0.1:8611 \"Canon MX920 series\" \"Canon MX920 series 10.0.0.1\" "
+    "\"MFG:Canon;CMD:BJL,BJRaster3;MDL:MX920 series;CLS:PRINTER;\"\n";
+
+TEST(BjnpDiscovery, FillsTheRecordFromTheAddressLine) {
+    PlaceProgram(kBjnp, Listing(std::string("network bjnp://10.0.0.11:8611 \"x\" \"x\" \"MFG:Other;MDL:Y;\"\n") +
+                                kBjnpLine));
+    NetPrinterInfo info{};
+    std::strcpy(info.szQName, "kept");
+    errno = EAGAIN;
+    EXPECT_EQ(XAVOPrinterNetBjnpInfoGet("10.0.0.1", &info), 0);
+    EXPECT_EQ(errno, EAGAIN);
+    EXPECT_STREQ(info.szBackend, "bjnp");
+    EXPECT_STREQ(info.szBrand, "Canon");
+    EXPECT_STREQ(info.szModel, "MX920 series");
+    EXPECT_STREQ(info.szStringId, "MFG:Canon;CMD:BJL,BJRaster3;MDL:MX920 series;CLS:PRINTER");
+    EXPECT_STREQ(info.szQName, "kept");
+    EXPECT_THAT(TakeSleeps(), IsEmpty());
+}
+
+TEST(BjnpDiscovery, NotListedAnswersOneAtOnce) {
+    struct {
+        const char *szName;
+        std::string listing;
+    } const cases[] = {
+        {"unknown first", std::string("network bjnp \"Unknown\" \"Canon network printer\"\n") + kBjnpLine},
+        {"only a longer address", "network bjnp://10.0.0.11:8611 \"x\" \"x\" \"MFG:C;MDL:D;\"\n"},
+        {"empty", ""},
+    };
+    for (const auto &c : cases) {
+        PlaceProgram(kBjnp, Listing(c.listing));
+        NetPrinterInfo info{};
+        EXPECT_EQ(XAVOPrinterNetBjnpInfoGet("10.0.0.1", &info), 1) << c.szName;
+        EXPECT_STREQ(info.szBackend, "") << c.szName;
+        EXPECT_THAT(TakeSleeps(), IsEmpty()) << c.szName;
+    }
+}
+
+TEST(BjnpDiscovery, FailedListingsAreRetriedThreeTimesASecondApart) {
+    PlaceProgram(kBjnp, Listing("network bjnp://10.0.0.1:8611 \"Unidentified printer\" \"x\" \"\"\n"));
+    NetPrinterInfo info{};
+    EXPECT_EQ(XAVOPrinterNetBjnpInfoGet("10.0.0.1", &info), -1);
+    EXPECT_EQ(ORLICErrGet(), ERR_EXEC);
+    EXPECT_THAT(TakeSleeps(), ElementsAre(1000000u, 1000000u, 1000000u));
+
+    PlaceProgram(kBjnp, Listing("network bjnp://10.0.0.1:8611 \"C\" \"C\" \"MDL:D;\"\n"));
+    EXPECT_EQ(XAVOPrinterNetBjnpInfoGet("10.0.0.1", &info), -1);
+    EXPECT_EQ(ORLICErrGet(), ERR_EXEC);
+    EXPECT_EQ(LibraryLogs().size(), 3u) << "one line per attempt";
+    TakeSleeps();
+}
+
+TEST(BjnpDiscovery, BackendThatCannotStartIsTriedThreeTimesWithoutWaiting) {
+    NetPrinterInfo info{};  // no backend placed
+    EXPECT_EQ(XAVOPrinterNetBjnpInfoGet("10.0.0.1", &info), -1);
+    EXPECT_EQ(ORLICErrGet(), ERR_EXEC);
+    EXPECT_THAT(TakeSleeps(), IsEmpty());
+}
+
+constexpr char kPing[] = "/bin/ping";
+
+TEST(PingStatus, RealPingOnLoopbackAndWithoutRoute) {
+    char szStatus[16];
+    EXPECT_EQ(XAVOPrinterNetPingStatus("127.0.0.1", szStatus, sizeof szStatus), 0);
+    EXPECT_STREQ(szStatus, "Online");
+    // No interface but lo in the sandbox: no route, nothing is sent.
+    EXPECT_EQ(XAVOPrinterNetPingStatus("10.255.255.1", szStatus, sizeof szStatus), 0);
+    EXPECT_STREQ(szStatus, "Offline");
+}
+
+TEST(PingStatus, SummaryShapes) {
+    struct {
+        const char *szOutput;
+        int32_t cbStatus;
+        const char *szStatus;
+    } const cases[] = {
+        {"2 packets transmitted, 1 received, 50% packet loss, time 1001ms\n", 16, "Online"},
+        {"1 packets transmitted, 1 received, 0% packet loss, time 0ms\n", 4, "Onl"},
+        {"1 packets transmitted 100% packet loss\n", 16, "Offline"},
+        {"--- 10.0.0.1 ping statistics ---\n", 16, "Offline"},
+    };
+    for (const auto &c : cases) {
+        PlaceProgram(kPing, Listing(c.szOutput));
+        char szStatus[16] = "";
+        EXPECT_EQ(XAVOPrinterNetPingStatus("10.0.0.1", szStatus, c.cbStatus), 0) << c.szOutput;
+        EXPECT_STREQ(szStatus, c.szStatus) << c.szOutput;
+    }
+}
+
+TEST(HostileOutput, LongLinesNulBytesAndFloodsStayInsideTheBuffers) {
+    // A 5000-byte line without quotes, NUL bytes, then 20000 lines.
+    PlaceProgram(kPing,
+                 "#!/bin/sh\nhead -c 5000 /dev/zero | tr '\\0' 'x'\nprintf 'a\\0b packet loss\\n'\n"
+                 "i=0; while [ $i -lt 20000 ]; do echo \"line $i\"; i=$((i+1)); done\n");
+    char szStatus[16];
+    EXPECT_EQ(XAVOPrinterNetPingStatus("10.0.0.1", szStatus, sizeof szStatus), 0);
+    EXPECT_STREQ(szStatus, "Offline");
+
+    PlaceProgram("/usr/xavo/sbin/avahi-browse",
+                 "#!/bin/sh\nprintf '=;lo;IPv4;P;T;local;h;10.0.0.1;9100;\"usb_MFG='\n"
+                 "head -c 3000 /dev/zero | tr '\\0' 'M'\necho\n");
+    NetPrinterInfo info{};
+    EXPECT_EQ(XAVOPrinterNetAvahiInfoGet("10.0.0.1", &info), 0);
+    EXPECT_STREQ(info.szBackend, "socket");
+    EXPECT_STREQ(info.szBrand, "Not Found");
+    Logs();
+}
+
+constexpr char kBrowse[] = "/usr/xavo/sbin/avahi-browse";
+// Lines as avahi-browse -arpt printed them for services published on lo.
+constexpr char kBrowseLines[] =
+    "+;lo;IPv4;Office\\032Laser;PDL Printer;local\n"
+    "=;lo;IPv4;Office\\032Laser;Internet Printer;local;laser.local;127.0.0.1;631;\"usb_MDL=Laser 100\" \"txtvers=1\"\n"
+    "=;lo;IPv4;Office\\032Laser;PDL Printer;local;laser.local;127.0.0.1;9100;\"usb_CMD=PCL,PJL\" \"usb_MDL=Laser 100\" \"usb_MFG=ACME\"\n"
+    "=;lo;IPv4;Lab\\032Inkjet;UNIX Printer;local;inkjet.local;127.0.0.2;515;\n"
+    "=;lo;IPv4;Lab\\032Inkjet;Web Site;local;inkjet20.local;127.0.0.20;80;\"usb_MFG=Other\"\n"
+    "=;lo;IPv4;Lab\\032Inkjet;_canon-bjnp1._tcp;local;inkjet.local;127.0.0.2;8611;\"usb_CMD=BJL,BJRaster3\" \"usb_MFG=Canon\"\n"
+    "=;lo;IPv4;Lab\\032Inkjet;Web Site;local;inkjet20.local;127.0.0.20;80;\"usb_MFG=Other\"\n";
+
+TEST(AvahiDiscovery, ChoosesByPreferenceAndBuildsTheDeviceId) {
+    PlaceProgram(kBrowse, Listing(kBrowseLines));
+    NetPrinterInfo info{};
+    errno = EDOM;
+    EXPECT_EQ(XAVOPrinterNetAvahiInfoGet("127.0.0.1", &info), 0);
+    EXPECT_EQ(errno, EDOM);
+    EXPECT_STREQ(info.szBackend, "socket") << "socket before ipp whatever the order";
+    EXPECT_STREQ(info.szStringId, "MFG:ACME;CMD:PCL,PJL;MDL:Laser 100;CLS:PRINTER;DES:ACME Laser 100;");
+
+    // bjnp wins over the lpd line, whose empty TXT makes it no service;
+    // no model: "Not Found" for both.
+    NetPrinterInfo inkjet{};
+    EXPECT_EQ(XAVOPrinterNetAvahiInfoGet("127.0.0.2", &inkjet), 0);
+    EXPECT_STREQ(inkjet.szBackend, "bjnp");
+    EXPECT_STREQ(inkjet.szBrand, "Not Found");
+    EXPECT_STREQ(inkjet.szStringId, "MFG:Not Found;CMD:BJL,BJRaster3;MDL:Not Found;CLS:PRINTER;DES:Not Found Not Found;");
+    EXPECT_THAT(LibraryLogs(), ElementsAre("3 printer_net_avahi_info_get:N Failed to make printer string ID. Info: "
+                                    "\"usb_CMD=BJL,BJRaster3\" \"usb_MFG=Canon\""));
+
+    // A record that holds a device ID keeps it.
+    NetPrinterInfo kept{};
+    std::strcpy(kept.szStringId, "MFG:Snmp;MDL:Given;");
+    EXPECT_EQ(XAVOPrinterNetAvahiInfoGet("127.0.0.1", &kept), 0);
+    EXPECT_STREQ(kept.szStringId, "MFG:Snmp;MDL:Given;");
+    EXPECT_STREQ(kept.szModel, "Laser 100");
+
+    // 127.0.0.2 is only a prefix of 127.0.0.20, whose only service is a web page.
+    NetPrinterInfo web{};
+    EXPECT_EQ(XAVOPrinterNetAvahiInfoGet("127.0.0.20", &web), 1);
+    EXPECT_STREQ(web.szBackend, "");
+    EXPECT_EQ(XAVOPrinterNetAvahiInfoGet("127.0.0", &web), 1);
+}
+
+// ---- interrupted reads: a repeating SIGALRM without SA_RESTART ----
+void OnAlarm(int) {}
+
+class InterruptedReads : public ::testing::Test {
+protected:
+    void StartTimer(long usInterval) {
+        struct sigaction sa {};
+        sa.sa_handler = OnAlarm;  // no SA_RESTART: reads return EINTR
+        sigaction(SIGALRM, &sa, &old_);
+        itimerval timer{{0, usInterval}, {0, usInterval}};
+        setitimer(ITIMER_REAL, &timer, nullptr);
+    }
+    void TearDown() override {
+        itimerval off{};
+        setitimer(ITIMER_REAL, &off, nullptr);
+        sigaction(SIGALRM, &old_, nullptr);
+    }
+    struct sigaction old_ {};
+};
+
+TEST_F(InterruptedReads, FewAreSurvivedTheTenthEndsTheCall) {
+    PlaceProgram(kPing, "#!/bin/sh\nsleep 0.3\necho '1 packets transmitted, 1 received, 0% packet loss, time 0ms'\n");
+    StartTimer(100000);  // about 3 interruptions before the line
+    char szStatus[16];
+    EXPECT_EQ(XAVOPrinterNetPingStatus("10.0.0.1", szStatus, sizeof szStatus), 0);
+    EXPECT_STREQ(szStatus, "Online");
+
+    PlaceProgram(kPing, "#!/bin/sh\nsleep 2\necho '1 packets transmitted, 1 received, 0% packet loss'\n");
+    StartTimer(20000);  // far more than ten before the line
+    errno = ERANGE;
+    EXPECT_EQ(XAVOPrinterNetPingStatus("10.0.0.1", szStatus, sizeof szStatus), -1);
+    EXPECT_EQ(errno, ERANGE);
+    EXPECT_STREQ(szStatus, "Offline");
+
+    PlaceProgram(kBjnp, "#!/bin/sh\nsleep 0.5\n" + std::string("echo '") + kBjnpLine + "'\n");
+    NetPrinterInfo info{};
+    EXPECT_EQ(XAVOPrinterNetBjnpInfoGet("10.0.0.1", &info), -1) << "each listing is spoilt by a signal";
+    EXPECT_THAT(TakeSleeps(), ElementsAre(1000000u, 1000000u, 1000000u));
+}
+
+// ---- SNMP against the real snmpd ----
+const std::string kDeviceId = "MFG:ACME;CMD:PCL,PJL;MDL:LaserJet 100;CLS:PRINTER;DES:ACME LaserJet 100;";
+
+class SnmpProbe : public ::testing::Test {
+protected:
+    void SetUp() override {
+        if (agents_) return;
+        PlaceSnmpClientConfig();
+        agents_ = new std::vector<std::unique_ptr<SnmpAgent>>;
+        agents_->push_back(std::make_unique<SnmpAgent>(
+            "127.0.0.1", std::vector<SnmpValue>{{".1.1.0", "integer", "7"},
+                                                {".1.2.0", "octet_str", kDeviceId},
+                                                {".1.3.0", "octet_str", "LPR://127.0.0.1/lp1"},
+                                                {".1.4.0", "octet_str", "plain text"}}));
+        agents_->push_back(std::make_unique<SnmpAgent>("127.0.0.2", std::vector<SnmpValue>{{".1.2.0", "octet_str", kDeviceId}}));
+        agents_->push_back(std::make_unique<SnmpAgent>(
+            "127.0.0.3", std::vector<SnmpValue>{{".1.3.0", "octet_str", "socket://127.0.0.3:9100"},
+                                                {".1.4.0", "octet_str", "plain text"}}));
+    }
+    static void TearDownTestSuite() {
+        delete agents_;
+        agents_ = nullptr;
+    }
+    static std::vector<std::unique_ptr<SnmpAgent>> *agents_;
+};
+std::vector<std::unique_ptr<SnmpAgent>> *SnmpProbe::agents_ = nullptr;
+XAVO_SANDBOX_PER_SUITE(SnmpProbe);
+
+TEST_F(SnmpProbe, AnswersOfRealAgents) {
+    for (auto &agent : *agents_) ASSERT_TRUE(agent->running());
+    NetPrinterInfo info;
+    std::memset(&info, 'x', sizeof info);
+    EXPECT_EQ(XAVOPrinterNetInfoGetByIP("127.0.0.1", &info), 0);
+    EXPECT_STREQ(info.szIP, "");
+    EXPECT_STREQ(info.szBackend, "lpd");
+    EXPECT_STREQ(info.szQName, "lp1");
+    EXPECT_EQ(std::string(info.szStringId), kDeviceId);
+    EXPECT_STREQ(info.szBrand, "ACME");
+    EXPECT_STREQ(info.szModel, "LaserJet 100");
+
+    EXPECT_EQ(XAVOPrinterNetInfoGetByIP("127.0.0.2", &info), 1) << "device ID without URI";
+    EXPECT_STREQ(info.szBackend, "");
+    EXPECT_STREQ(info.szModel, "LaserJet 100");
+
+    EXPECT_EQ(XAVOPrinterNetInfoGetByIP("127.0.0.3", &info), -1) << "URI without device ID";
+    EXPECT_STREQ(info.szBackend, "socket");
+    EXPECT_STREQ(info.szQName, "");
+    EXPECT_THAT(Logs(), ::testing::Contains(::testing::HasSubstr("Failed to get network printer string ID.")));
+
+    EXPECT_EQ(XAVOPrinterNetInfoGetByIP("127.0.0.4", &info), 1) << "no agent: the tool's own time-out";
+    EXPECT_STREQ(info.szStringId, "");
+    EXPECT_THAT(Logs(), IsEmpty());
+}
+
+TEST_F(SnmpProbe, DeviceIdAtTheBufferBound) {
+    std::string buf(kDeviceId.size() + 1, 'x');
+    EXPECT_EQ(XAVOPrinterNetGetStringId("127.0.0.2", buf.data(), static_cast<int32_t>(kDeviceId.size() + 1)), 0);
+    EXPECT_EQ(std::string(buf.c_str()), kDeviceId);
+    EXPECT_EQ(XAVOPrinterNetGetStringId("127.0.0.2", buf.data(), static_cast<int32_t>(kDeviceId.size())), -1);
+    EXPECT_EQ(ORLICErrGet(), ERR_BAD_DATA);
+    EXPECT_STREQ(buf.c_str(), "");
+}
+
+}  // namespace

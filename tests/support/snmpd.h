@@ -1,0 +1,102 @@
+// A real net-snmp agent (Debian's snmpd) answering as a network printer on
+// one loopback address of the sandbox's private network, port 161, and the
+// client configuration the real snmpwalk needs there: a MIB directory with
+// the few definitions that name "enterprises", and a short time-out so
+// that an address where no agent answers costs one second per walk.
+//
+// One agent per address, each stopped by its own pid.  Every value is
+// published with snmpd's "override" directive under a private enterprise
+// number, and the agent's view is cut down to that subtree so that a walk
+// of "enterprises" shows only the printer's values.
+#pragma once
+
+#include <signal.h>
+#include <spawn.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <chrono>
+#include <cstdio>
+#include <string>
+#include <thread>
+#include <utility>
+#include <vector>
+
+#include "sandbox/sandbox.h"
+
+extern char **environ;
+
+namespace xavo::test {
+
+inline constexpr char kSnmpEnterprise[] = ".1.3.6.1.4.1.99999";
+
+// One published value: its OID below the enterprise, an snmpd type
+// ("octet_str", "integer") and the value as snmpd.conf takes it.
+struct SnmpValue {
+    std::string suffix;  // ".1.1.0"
+    std::string type;
+    std::string value;
+};
+
+// The client side, written once per sandbox.
+inline void PlaceSnmpClientConfig() {
+    PlaceFile("/usr/share/snmp/mibs/SNMPv2-SMI.txt",
+              "SNMPv2-SMI DEFINITIONS ::= BEGIN\n"
+              "org            OBJECT IDENTIFIER ::= { iso 3 }\n"
+              "dod            OBJECT IDENTIFIER ::= { org 6 }\n"
+              "internet       OBJECT IDENTIFIER ::= { dod 1 }\n"
+              "private        OBJECT IDENTIFIER ::= { internet 4 }\n"
+              "enterprises    OBJECT IDENTIFIER ::= { private 1 }\n"
+              "END\n");
+    PlaceFile("/etc/snmp/snmp.conf",
+              "mibdirs /usr/share/snmp/mibs\n"
+              "mibs SNMPv2-SMI\n"
+              "timeout 1\n"
+              "retries 0\n");
+}
+
+class SnmpAgent {
+public:
+    SnmpAgent(const std::string &address, const std::vector<SnmpValue> &values) {
+        std::string dir = "/tmp/snmpd-" + address;
+        std::string conf = std::string("view printer included ") + kSnmpEnterprise + "\n" +
+                           "rocommunity public default -V printer\n";
+        for (const SnmpValue &v : values) {
+            conf += "override " + std::string(kSnmpEnterprise) + v.suffix + " " + v.type + " \"" + v.value + "\"\n";
+        }
+        PlaceFile(dir + "/snmpd.conf", conf);
+        std::string confPath = dir + "/snmpd.conf";
+        std::string pidPath = dir + "/snmpd.pid";
+        std::string listen = "udp:" + address + ":161";
+        std::string persist = "SNMP_PERSISTENT_DIR=" + dir;
+        std::vector<std::string> args = {"/usr/sbin/snmpd", "-f", "-Ln", "-C", "-c", confPath, "-p", pidPath, listen};
+        std::vector<char *> argv;
+        for (std::string &a : args) argv.push_back(a.data());
+        argv.push_back(nullptr);
+        std::vector<char *> envp = {persist.data(), nullptr};
+        if (posix_spawn(&pid_, argv[0], nullptr, nullptr, argv.data(), envp.data()) != 0) pid_ = -1;
+        // snmpd writes its pid file once its transports are open.
+        for (int i = 0; i < 100 && pid_ > 0 && !FileExists(pidPath); ++i) {
+            std::this_thread::sleep_for(std::chrono::milliseconds(50));
+        }
+    }
+    SnmpAgent(const SnmpAgent &) = delete;
+    SnmpAgent &operator=(const SnmpAgent &) = delete;
+    ~SnmpAgent() {
+        if (pid_ <= 0) return;
+        ::kill(pid_, SIGTERM);
+        int status = 0;
+        for (int i = 0; i < 100; ++i) {
+            if (::waitpid(pid_, &status, WNOHANG) == pid_) return;
+            std::this_thread::sleep_for(std::chrono::milliseconds(20));
+        }
+        ::kill(pid_, SIGKILL);
+        ::waitpid(pid_, &status, 0);
+    }
+    bool running() const { return pid_ > 0 && ::kill(pid_, 0) == 0; }
+
+private:
+    pid_t pid_ = -1;
+};
+
+}  // namespace xavo::test
