@@ -423,3 +423,53 @@ TEST_F(SnmpProbe, DeviceIdAtTheBufferBound) {
 }
 
 }  // namespace
+
+namespace {
+
+// Both lookups over the same fake walk output.
+TEST(SnmpToolOutput, ThreeWayAnswersOfBothLookups) {
+    struct {
+        const char *szName;
+        std::string output;
+        int32_t idResult;
+        int32_t backendResult;
+        const char *szBackend;
+    } const cases[] = {
+        {"no answer", "", 1, 1, ""},
+        {"unrelated values", "SNMPv2-SMI::enterprises.99999.1.3.0 = INTEGER: 42\nEnd of MIB\n", -1, 1, ""},
+        {"keys only in lower case", "x = STRING: \"mfg:a;mdl:b;\"\n", -1, 1, ""},
+        {"URI line without a quote ends the lookup",
+         "x = STRING: ipp://h/q\ny = STRING: \"ipp://h/q\"\n", -1, -1, ""},
+        {"unmapped scheme", "x = STRING: \"ipps://h/q\"\n", -1, -1, ""},
+        {"marker missing, next line taken",
+         "MFG:A;MODEL:B;\nx = STRING: \"MFG:A;MDL:B;\"\ny = STRING: \"bjnp://h\"\n", 0, 0, "bjnp"},
+    };
+    for (const auto &c : cases) {
+        PlaceProgram("/usr/bin/snmpwalk", Listing(c.output));
+        char szId[64] = "x";
+        char szBackend[16] = "", szQName[16] = "";
+        EXPECT_EQ(XAVOPrinterNetGetStringId("10.0.0.1", szId, sizeof szId), c.idResult) << c.szName;
+        EXPECT_EQ(XAVOPrinterNetGetStringBackend("10.0.0.1", szBackend, sizeof szBackend, szQName, sizeof szQName),
+                  c.backendResult)
+            << c.szName;
+        EXPECT_STREQ(szBackend, c.szBackend) << c.szName;
+        if (c.idResult != 0) {
+            EXPECT_STREQ(szId, "") << c.szName;
+        }
+    }
+    LibraryLogs();
+}
+
+TEST_F(InterruptedReads, SnmpWalkSurvivesNineAndGivesUpAtTheTenth) {
+    PlaceProgram("/usr/bin/snmpwalk", "#!/bin/sh\nsleep 2\necho 'x = STRING: \"MFG:A;MDL:B;\"'\n");
+    StartTimer(20000);
+    char szId[64];
+    errno = ENOTTY;
+    EXPECT_EQ(XAVOPrinterNetGetStringId("10.0.0.1", szId, sizeof szId), -1);
+    EXPECT_EQ(errno, ENOTTY);
+    NetPrinterInfo info{};
+    EXPECT_EQ(XAVOPrinterNetAvahiInfoGet("10.0.0.1", &info), -1) << "no browser placed: cannot start";
+    EXPECT_THAT(LibraryLogs(), ::testing::SizeIs(1));
+}
+
+}  // namespace
