@@ -12,6 +12,14 @@ if [ "$(id -u)" -ne 0 ]; then
   exit 2
 fi
 
+# The sandbox gives every suite a fresh, empty /tmp and /run: a checkout
+# there would vanish from under its own tests.
+case "$PWD/" in
+  /tmp/*|/run/*)
+    echo "scripts/test.sh: run it from a checkout outside /tmp and /run (the test sandbox replaces them)" >&2
+    exit 2 ;;
+esac
+
 bash scripts/install-deps.sh
 
 jobs=$(nproc)
