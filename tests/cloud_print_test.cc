@@ -9,6 +9,7 @@
 
 #include "appliance/standin_control.h"
 #include "support/logs.h"
+#include "support/sections.h"
 #include "xavoprinter.h"
 
 using ::testing::ElementsAre;
@@ -22,22 +23,9 @@ namespace {
 constexpr char kConf[] = "/usr/xavo/etc/printer.conf";
 constexpr char kSection[] = "Google Cloud Print";
 
-using Section = std::map<std::string, std::string>;
+using xavo::test::Section;
 
-Section ReadSection() {
-    ORLICSzHash *hash = ORLICSzHashAlloc(512);
-    ORLICFileGetSection(kConf, kSection, &hash);
-    ORLICSzList *keys = ORLICSzListAlloc(256);
-    Section out;
-    int n = ORLICSzHashEnumKey(hash, &keys);
-    for (int i = 0; i < n; ++i) {
-        const char *key = ORLICSzListGet(keys, i);
-        out[key] = ORLICSzHashGetValue(hash, key);
-    }
-    ORLICSzListFree(keys);
-    ORLICSzHashFree(hash);
-    return out;
-}
+Section ReadSection() { return xavo::test::ReadSection(kConf, kSection); }
 
 void WriteSection(const Section &keys) {
     ORLICSzHash *hash = ORLICSzHashAlloc(512);

@@ -14,6 +14,7 @@
 
 #include "support/fault_sweep.h"
 #include "support/logs.h"
+#include "support/sections.h"
 #include "xavoprinter.h"
 
 using ::testing::ElementsAre;
@@ -26,29 +27,10 @@ constexpr char kConf[] = "/usr/xavo/etc/printer.conf";
 constexpr char kLockFile[] = "/run/xavosdk/lock/lock_printer";
 constexpr char kPrinter[] = "04b8:0005:SN0001";
 
-using Section = std::map<std::string, std::string>;
+using xavo::test::Section;
 
-Section ReadSection(const char *szSection) {
-    ORLICSzHash *hash = ORLICSzHashAlloc(512);
-    ORLICFileGetSection(kConf, szSection, &hash);
-    ORLICSzList *keys = ORLICSzListAlloc(256);
-    Section out;
-    int n = ORLICSzHashEnumKey(hash, &keys);
-    for (int i = 0; i < n; ++i) {
-        const char *key = ORLICSzListGet(keys, i);
-        out[key] = ORLICSzHashGetValue(hash, key);
-    }
-    ORLICSzListFree(keys);
-    ORLICSzHashFree(hash);
-    return out;
-}
-
-void WriteSection(const char *szSection, const Section &keys) {
-    ORLICSzHash *hash = ORLICSzHashAlloc(512);
-    for (const auto &[k, v] : keys) ORLICSzHashSetValue(&hash, k.c_str(), v.c_str());
-    ASSERT_GT(ORLICFileAddSection(kConf, szSection, hash, "\t%s = %s\n"), 0);
-    ORLICSzHashFree(hash);
-}
+Section ReadSection(const char *szSection) { return xavo::test::ReadSection(kConf, szSection); }
+void WriteSection(const char *szSection, const Section &keys) { xavo::test::WriteSection(kConf, szSection, keys); }
 
 UsbPrinterConf Record(const char *szPrinterId) {
     UsbPrinterConf conf;
