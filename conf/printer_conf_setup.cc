@@ -5,6 +5,7 @@
 #include <string>
 
 #include "conf/conf_paths.h"
+#include "conf/conf_section.h"
 #include "internal/boundary.h"
 #include "internal/guards.h"
 #include "internal/log.h"
@@ -13,8 +14,6 @@
 
 namespace {
 constexpr char kUnit[] = "printer_conf_setup";
-constexpr char kLogAddSectionFailed[] = "%s:%d ORLICFileAddSection failed.(0x%04X)";
-constexpr char kLogSetSectionFailed[] = "%s:%d ORLICFileSetSection failed.(0x%04X)";
 
 // One key of the section and the record field that feeds it.  Fields marked
 // clearable are also put when empty if the caller asks for it, which clears
@@ -82,21 +81,6 @@ XAVO_EXPORT int32_t XAVOPrinterConfSetup(const UsbPrinterConf *pPrinterConf, int
             }
         }
 
-        int32_t iAdded = ORLICFileAddSection(xavo::kPrinterConfPath, printerId.c_str(), hash.get(),
-                                             xavo::kSectionLineFormat);
-        if (iAdded > 0) return 0;
-        if (iAdded < 0) {
-            XLOG(LOG_ERR, kLogAddSectionFailed, ORLICErrGet());
-            return iAdded;
-        }
-        if (ORLICFileSetSection(xavo::kPrinterConfPath, printerId.c_str(), printerId.c_str(), hash.get(),
-                                xavo::kSectionLineFormat) >= 1) {
-            return 0;
-        }
-        XLOG(LOG_ERR, kLogSetSectionFailed, ORLICErrGet());
-        // A section that could not be replaced is a failed setup: the
-        // enable flow reports any negative result, and the platform's error
-        // code is left as the failed replace set it.
-        return -1;
+        return XWRITE_CONF_SECTION(printerId.c_str(), hash.get());
     });
 }

@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "conf/conf_paths.h"
+#include "conf/conf_section.h"
 #include "internal/boundary.h"
 #include "internal/guards.h"
 #include "internal/log.h"
@@ -15,8 +16,6 @@
 
 namespace {
 constexpr char kUnit[] = "printer_net_conf_setup";
-constexpr char kLogAddSectionFailed[] = "%s:%d ORLICFileAddSection failed.(0x%04X)";
-constexpr char kLogSetSectionFailed[] = "%s:%d ORLICFileSetSection failed.(0x%04X)";
 constexpr int32_t kHashCapacity = 512;
 
 // How the backend decides the "QName" key: the remote queue of an lpd or
@@ -97,20 +96,6 @@ XAVO_EXPORT int32_t XAVOPrinterNetConfSetup(const NetPrinterConf *pNPConf, int32
             }
         }
 
-        const int32_t iAdded = ORLICFileAddSection(xavo::kPrinterConfPath, printerId.c_str(), hash.get(),
-                                                   xavo::kSectionLineFormat);
-        if (iAdded > 0) return 0;
-        if (iAdded < 0) {
-            XLOG(LOG_ERR, kLogAddSectionFailed, ORLICErrGet());
-            return iAdded;
-        }
-        if (ORLICFileSetSection(xavo::kPrinterConfPath, printerId.c_str(), printerId.c_str(), hash.get(),
-                                xavo::kSectionLineFormat) >= 1) {
-            return 0;
-        }
-        XLOG(LOG_ERR, kLogSetSectionFailed, ORLICErrGet());
-        // A section that could not be replaced is a failed setup, as for
-        // USB printers; the platform's error code stays as it set it.
-        return -1;
+        return XWRITE_CONF_SECTION(printerId.c_str(), hash.get());
     });
 }

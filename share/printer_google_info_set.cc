@@ -4,6 +4,7 @@
 #include <string>
 
 #include "conf/conf_paths.h"
+#include "conf/conf_section.h"
 #include "internal/boundary.h"
 #include "internal/guards.h"
 #include "internal/log.h"
@@ -17,8 +18,6 @@ constexpr char kLogNoAccount[] = "%s:%d google account can't be empty";
 constexpr char kLogEncryptFailed[] = "%s:%d encrypt failed";
 constexpr char kLogNoPassword[] = "%s:%d password can't be empty";
 constexpr char kLogNoToken[] = "%s:%d refresh token can't be empty";
-constexpr char kLogAddSectionFailed[] = "%s:%d ORLICFileAddSection failed.(0x%04X)";
-constexpr char kLogSetSectionFailed[] = "%s:%d ORLICFileSetSection failed.(0x%04X)";
 
 // Enciphers a record field into cipher; the field is copied first so that
 // a caller's unterminated field is never read past its end.  False when the
@@ -32,26 +31,6 @@ bool Encipher(const char (&field)[N], xavo::SecretBuf<xavo::kCipherBufSize> &cip
         return false;
     }
     return true;
-}
-
-// Writes the section whole: added when the file has none yet, replaced
-// otherwise.
-int32_t WriteSection(const xavo::SzHash &hash) {
-    int32_t iAdded = ORLICFileAddSection(xavo::kPrinterConfPath, xavo::kGoogleSection, hash.get(),
-                                         xavo::kSectionLineFormat);
-    if (iAdded > 0) return 0;
-    if (iAdded < 0) {
-        XLOG(LOG_ERR, kLogAddSectionFailed, ORLICErrGet());
-        return iAdded;
-    }
-    if (ORLICFileSetSection(xavo::kPrinterConfPath, xavo::kGoogleSection, xavo::kGoogleSection, hash.get(),
-                            xavo::kSectionLineFormat) > 0) {
-        return 0;
-    }
-    XLOG(LOG_ERR, kLogSetSectionFailed, ORLICErrGet());
-    // An account that was not stored is a failed set, whichever write
-    // refused it; the platform's error code stays as the replace left it.
-    return -1;
 }
 
 }  // namespace
@@ -101,6 +80,6 @@ XAVO_EXPORT int32_t XAVOPrinterGoogleInfoSet(const PrinterGoogleInfo *pInfo) noe
             XSETERR(ERR_LOCK);
             return -1;
         }
-        return WriteSection(hash);
+        return XWRITE_CONF_SECTION(xavo::kGoogleSection, hash.get());
     });
 }
