@@ -13,7 +13,7 @@
 #include <vector>
 
 #include "appliance/standin_control.h"
-#include "support/cupsd.h"
+#include "sandbox/cupsd.h"
 #include "support/logs.h"
 #include "xavoprinter.h"
 

@@ -8,9 +8,9 @@
 #include <cstring>
 #include <string>
 
-#include "support/cupsd.h"
+#include "sandbox/cupsd.h"
 #include "support/logs.h"
-#include "support/socket_listener.h"
+#include "sandbox/socket_listener.h"
 #include "xavoprinter.h"
 
 using ::testing::AllOf;

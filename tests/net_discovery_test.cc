@@ -12,7 +12,7 @@
 
 #include "sandbox/sandbox.h"
 #include "support/logs.h"
-#include "support/snmpd.h"
+#include "sandbox/snmpd.h"
 #include "xavoprinter.h"
 
 // The readers are internal to the library: compiled into this suite.

@@ -10,9 +10,9 @@
 #include <vector>
 
 #include "appliance/standin_control.h"
-#include "support/cupsd.h"
+#include "sandbox/cupsd.h"
 #include "support/logs.h"
-#include "support/socket_listener.h"
+#include "sandbox/socket_listener.h"
 #include "xavoprinter.h"
 
 using ::testing::ElementsAre;

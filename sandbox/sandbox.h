@@ -1,7 +1,7 @@
-// The test sandbox.
+// The appliance sandbox.
 //
-// Every test executable's main() (sandbox_main.cc) enters a private mount
-// and network namespace before GoogleTest starts.  Inside it the paths the
+// Every test executable's main() (tests/sandbox_main.cc), and the demo,
+// enter a private mount and network namespace first thing.  Inside it the paths the
 // library works on are private: /usr, /etc, /var and /root are overlays
 // whose writes vanish with the sandbox, /tmp and /run are fresh tmpfs, /dev
 // is a private tmpfs holding the few real nodes tests need, /sys is a fake
