@@ -25,24 +25,6 @@ constexpr char kDeviceUriFormat[] = "usb:/dev/usb/%s";
 constexpr int kNameSize = 64;
 constexpr int kDeviceUriSize = 4096;
 
-// Which of the two USB queue names CUPS already holds.  The marks are kept
-// across attempts: a name seen once is taken, even if a later listing
-// failed half-way.
-class FreeNameRule final : public xavo::QueueListRule {
-public:
-    bool Begin(const FILE *) override { return true; }
-    bool Line(const char *szLine) override {
-        if (!bFirstUsed && std::strstr(szLine, xavo::kFirstUsbQueue) != nullptr) {
-            bFirstUsed = true;
-        } else if (!bSecondUsed && std::strstr(szLine, kSecondQueue) != nullptr) {
-            bSecondUsed = true;
-        }
-        return false;
-    }
-    bool bFirstUsed = false;
-    bool bSecondUsed = false;
-};
-
 // The stored name when CUPS does not hold it for another device, else a
 // free "usbprinter%d"; false when both are taken.
 bool ChooseName(const char *szPrinterId, char (&szName)[kNameSize]) {
@@ -54,13 +36,25 @@ bool ChooseName(const char *szPrinterId, char (&szName)[kNameSize]) {
     if (!xavo::SchedulerRunning()) {
         XLOG(LOG_ERR, kLogNotRunning, xavo::kSchedulerService);
     } else {
-        // An unreadable list leaves the marks as far as they got: creation
-        // then tries the first name not seen.
-        FreeNameRule rule;
-        xavo::ReadQueueList(rule);
-        if (!rule.bFirstUsed) {
+        // Which of the two USB queue names CUPS already holds.  The marks
+        // are kept across attempts: a name seen once is taken, even if a
+        // later listing failed half-way.  An unreadable list leaves the
+        // marks as far as they got: creation then tries the first name not
+        // seen.
+        bool bFirstUsed = false;
+        bool bSecondUsed = false;
+        xavo::ReadQueueList([](const FILE *) { return true; },
+                            [&](const char *szLine) {
+                                if (!bFirstUsed && std::strstr(szLine, xavo::kFirstUsbQueue) != nullptr) {
+                                    bFirstUsed = true;
+                                } else if (!bSecondUsed && std::strstr(szLine, kSecondQueue) != nullptr) {
+                                    bSecondUsed = true;
+                                }
+                                return false;
+                            });
+        if (!bFirstUsed) {
             iIndex = 1;
-        } else if (!rule.bSecondUsed) {
+        } else if (!bSecondUsed) {
             iIndex = 2;
         } else {
             XLOG(LOG_ERR, kLogNoName, szPrinterId);
