@@ -4,6 +4,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstring>
 
@@ -188,6 +189,24 @@ bool ReplaceFile(const char *szPath, std::string_view content, Failure *pFailure
     return true;
 }
 
+bool LoadTextFile(const char *szPath, bool bMissingIsEmpty, std::string *pText, const char *szUnit, int iLine) {
+    ReadResult result = ReadTextFile(szPath, pText);
+    if (result == ReadResult::kMissing && bMissingIsEmpty) {
+        pText->clear();
+        return true;
+    }
+    if (result == ReadResult::kOk) return true;
+    SetError(kErrOpen, szUnit, iLine);
+    return false;
+}
+
+bool StoreTextFile(const char *szPath, std::string_view text, const char *szUnit) {
+    Failure failure;
+    if (ReplaceFile(szPath, text, &failure)) return true;
+    SetError(failure.code, szUnit, failure.line);
+    return false;
+}
+
 std::string_view Trim(std::string_view text) {
     while (!text.empty() && IsBlank(text.front())) text.remove_prefix(1);
     while (!text.empty() && IsBlank(text.back())) text.remove_suffix(1);
@@ -215,6 +234,19 @@ std::vector<std::string> SplitLines(std::string_view text) {
         text.remove_prefix(len);
     }
     return lines;
+}
+
+std::string JoinLines(const std::vector<std::string> &lines) {
+    std::string text;
+    for (const std::string &line : lines) text += line;
+    return text;
+}
+
+int32_t CopyValue(std::string_view value, char *szBuf, int32_t cbBuf) {
+    size_t n = std::min(value.size(), static_cast<size_t>(cbBuf) - 1);
+    std::memcpy(szBuf, value.data(), n);
+    szBuf[n] = '\0';
+    return static_cast<int32_t>(n);
 }
 
 std::optional<std::string_view> ParseSectionHeader(std::string_view line) {

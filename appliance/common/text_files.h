@@ -30,6 +30,14 @@ ReadResult ReadTextFile(const char *szPath, std::string *pText);
 // *pFailure tells the code and line to report.
 bool ReplaceFile(const char *szPath, std::string_view content, Failure *pFailure);
 
+// The two above for an exported operation of the stand-ins, which report
+// failures through the last error under their own unit's name.  Loading
+// fails with ERR_OPEN (also for a symlink or a FIFO planted at the path); a
+// missing file reads as an empty one when bMissingIsEmpty.  Storing fails
+// with the code and line ReplaceFile gives.
+bool LoadTextFile(const char *szPath, bool bMissingIsEmpty, std::string *pText, const char *szUnit, int iLine);
+bool StoreTextFile(const char *szPath, std::string_view text, const char *szUnit);
+
 // ---- text ---------------------------------------------------------------
 
 std::string_view Trim(std::string_view text);
@@ -39,6 +47,11 @@ bool HasControl(std::string_view text);
 // Splits text into lines, each keeping its newline; a last line without one
 // is kept as it is.
 std::vector<std::string> SplitLines(std::string_view text);
+std::string JoinLines(const std::vector<std::string> &lines);
+
+// Copies a value read from a file into a caller's buffer (cbBuf > 0), cut
+// to fit as fixed-size fields are; the number of characters copied.
+int32_t CopyValue(std::string_view value, char *szBuf, int32_t cbBuf);
 
 struct KeyValue {
     std::string_view key;

@@ -33,32 +33,6 @@ bool ValueOk(const char *szValue) {
     return szValue != nullptr && !HasControl(szValue) && std::strchr(szValue, '"') == nullptr;
 }
 
-bool Load(const char *szPath, bool bMissingIsEmpty, std::string *pText, int iLine) {
-    switch (ReadTextFile(szPath, pText)) {
-        case ReadResult::kOk:
-            return true;
-        case ReadResult::kMissing:
-            if (bMissingIsEmpty) {
-                pText->clear();
-                return true;
-            }
-            SetError(kErrOpen, kUnit, iLine);
-            return false;
-        case ReadResult::kFailed:
-            break;
-    }
-    // Also a symlink or a FIFO planted at the path.
-    SetError(kErrOpen, kUnit, iLine);
-    return false;
-}
-
-bool Store(const char *szPath, const std::string &text) {
-    Failure failure;
-    if (ReplaceFile(szPath, text, &failure)) return true;
-    SetError(failure.code, kUnit, failure.line);
-    return false;
-}
-
 bool IsKeyLine(std::string_view line, std::string_view key) {
     auto kv = ParseKeyValueLine(line);
     return kv && kv->key == key;
@@ -75,7 +49,7 @@ XAVO_PLATFORM_API int32_t ORLICFileGetKeyValue(const char *szPath, const char *s
     }
     return XAVO_GUARD(int32_t{-1}, [&] {
         std::string text;
-        if (!Load(szPath, false, &text, __LINE__)) return int32_t{-1};
+        if (!LoadTextFile(szPath, false, &text, kUnit, __LINE__)) return int32_t{-1};
         std::optional<std::string> value;
         for (const std::string &line : SplitLines(text)) {
             auto kv = ParseKeyValueLine(line);
@@ -85,10 +59,7 @@ XAVO_PLATFORM_API int32_t ORLICFileGetKeyValue(const char *szPath, const char *s
             SetError(kErrKeyNotFound, kUnit, __LINE__);
             return int32_t{-1};
         }
-        size_t n = std::min(value->size(), static_cast<size_t>(cbBuf) - 1);
-        std::memcpy(szBuf, value->data(), n);
-        szBuf[n] = '\0';
-        return static_cast<int32_t>(n);
+        return CopyValue(*value, szBuf, cbBuf);
     });
 }
 
@@ -105,7 +76,7 @@ XAVO_PLATFORM_API int32_t ORLICFileSetKeyValue(const char *szPath, const char *s
         // A missing file is created: the USB printer table is gone after
         // every restart until its first entry is set.
         std::string text;
-        if (!Load(szPath, true, &text, __LINE__)) return int32_t{-1};
+        if (!LoadTextFile(szPath, true, &text, kUnit, __LINE__)) return int32_t{-1};
         std::vector<std::string> lines = SplitLines(text);
         auto first = std::find_if(lines.begin(), lines.end(),
                                   [&](const std::string &l) { return IsKeyLine(l, szKey); });
@@ -118,9 +89,7 @@ XAVO_PLATFORM_API int32_t ORLICFileSetKeyValue(const char *szPath, const char *s
                                        [&](const std::string &l) { return IsKeyLine(l, szKey); }),
                         lines.end());
         }
-        std::string out;
-        for (const std::string &l : lines) out += l;
-        return Store(szPath, out) ? int32_t{0} : int32_t{-1};
+        return StoreTextFile(szPath, JoinLines(lines), kUnit) ? int32_t{0} : int32_t{-1};
     });
 }
 
@@ -134,15 +103,13 @@ XAVO_PLATFORM_API int32_t ORLICFileRemoveKey(const char *szPath, const char *szK
     }
     return XAVO_GUARD(int32_t{-1}, [&] {
         std::string text;
-        if (!Load(szPath, true, &text, __LINE__)) return int32_t{-1};
+        if (!LoadTextFile(szPath, true, &text, kUnit, __LINE__)) return int32_t{-1};
         std::vector<std::string> lines = SplitLines(text);
         auto kept = std::remove_if(lines.begin(), lines.end(), [&](const std::string &l) { return IsKeyLine(l, szKey); });
         auto removed = static_cast<int32_t>(lines.end() - kept);
         if (removed == 0) return int32_t{0};
         lines.erase(kept, lines.end());
-        std::string out;
-        for (const std::string &l : lines) out += l;
-        return Store(szPath, out) ? removed : int32_t{-1};
+        return StoreTextFile(szPath, JoinLines(lines), kUnit) ? removed : int32_t{-1};
     });
 }
 
@@ -154,7 +121,7 @@ XAVO_PLATFORM_API int32_t ORLICFileGetPair(const char *szPath, ORLICSzHash **ppH
     }
     return XAVO_GUARD(int32_t{-1}, [&] {
         std::string text;
-        if (!Load(szPath, false, &text, __LINE__)) return int32_t{-1};
+        if (!LoadTextFile(szPath, false, &text, kUnit, __LINE__)) return int32_t{-1};
         // Collected first, so that a file that cannot be read leaves the
         // caller's hash as it was.  The pairs point into lines.
         std::vector<std::string> lines = SplitLines(text);

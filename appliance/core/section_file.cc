@@ -51,10 +51,16 @@ struct Document {
         return found;
     }
 
-    std::string Text() const {
-        std::string text;
-        for (const std::string &line : lines) text += line;
-        return text;
+    // The key lines of the given sections, in file order, with their line
+    // numbers.
+    std::vector<std::pair<size_t, KeyValue>> KeyLines(const std::vector<const Section *> &found) const {
+        std::vector<std::pair<size_t, KeyValue>> keys;
+        for (const Section *s : found) {
+            for (size_t i = s->header + 1; i < s->bodyEnd; ++i) {
+                if (auto kv = ParseSectionKeyLine(lines[i])) keys.emplace_back(i, *kv);
+            }
+        }
+        return keys;
     }
 };
 
@@ -91,32 +97,18 @@ bool SectionText(const char *szName, const ORLICSzHash *pHash, const char *szLin
     return true;
 }
 
-// Reads the file for an operation; false with the last error set.  A
-// missing file is an empty one when bMissingIsEmpty.
-bool Load(const char *szPath, bool bMissingIsEmpty, std::string *pText, int iLine) {
-    switch (ReadTextFile(szPath, pText)) {
-        case ReadResult::kOk:
-            return true;
-        case ReadResult::kMissing:
-            if (bMissingIsEmpty) {
-                pText->clear();
-                return true;
-            }
-            SetError(kErrOpen, kUnit, iLine);
-            return false;
-        case ReadResult::kFailed:
-            break;
+// The file of the operations that work inside an existing section: nothing,
+// with the last error set, when it cannot be read or has no section of the
+// name.
+std::optional<Document> LoadWithSection(const char *szPath, const char *szSection, int iLine) {
+    std::string text;
+    if (!LoadTextFile(szPath, false, &text, kUnit, iLine)) return std::nullopt;
+    Document doc(text);
+    if (doc.Named(szSection).empty()) {
+        SetError(kErrNotFound, kUnit, iLine);
+        return std::nullopt;
     }
-    // Also a symlink or a FIFO planted at the path.
-    SetError(kErrOpen, kUnit, iLine);
-    return false;
-}
-
-bool Store(const char *szPath, const std::string &text) {
-    Failure failure;
-    if (ReplaceFile(szPath, text, &failure)) return true;
-    SetError(failure.code, kUnit, failure.line);
-    return false;
+    return doc;
 }
 
 void EndWithNewline(std::string *pLine) {
@@ -132,24 +124,13 @@ XAVO_PLATFORM_API int32_t ORLICFileGetSection(const char *szPath, const char *sz
         return -1;
     }
     return XAVO_GUARD(int32_t{-1}, [&] {
-        std::string text;
-        if (!Load(szPath, false, &text, __LINE__)) return int32_t{-1};
-        Document doc(text);
-        auto found = doc.Named(szSection);
-        if (found.empty()) {
-            SetError(kErrNotFound, kUnit, __LINE__);
-            return int32_t{-1};
-        }
+        auto doc = LoadWithSection(szPath, szSection, __LINE__);
+        if (!doc) return int32_t{-1};
         // Collected first, so that a section that cannot be read leaves the
         // caller's hash as it was.
-        std::vector<KeyValue> pairs;
-        for (const Section *s : found) {
-            for (size_t i = s->header + 1; i < s->bodyEnd; ++i) {
-                if (auto kv = ParseSectionKeyLine(doc.lines[i])) pairs.push_back(*kv);
-            }
-        }
-        for (const KeyValue &kv : pairs) xavo::core::HashSet(ppHash, kv.key, kv.value);
-        return static_cast<int32_t>(pairs.size());
+        auto keys = doc->KeyLines(doc->Named(szSection));
+        for (const auto &[i, kv] : keys) xavo::core::HashSet(ppHash, kv.key, kv.value);
+        return static_cast<int32_t>(keys.size());
     });
 }
 
@@ -162,7 +143,7 @@ XAVO_PLATFORM_API int32_t ORLICFileAddSection(const char *szPath, const char *sz
     }
     return XAVO_GUARD(int32_t{-1}, [&] {
         std::string text;
-        if (!Load(szPath, true, &text, __LINE__)) return int32_t{-1};
+        if (!LoadTextFile(szPath, true, &text, kUnit, __LINE__)) return int32_t{-1};
         if (!Document(text).Named(szSection).empty()) return int32_t{0};
         std::string section;
         if (!SectionText(szSection, pHash, szLineFormat, &section)) {
@@ -171,7 +152,7 @@ XAVO_PLATFORM_API int32_t ORLICFileAddSection(const char *szPath, const char *sz
         }
         EndWithNewline(&text);
         text += section;
-        return Store(szPath, text) ? int32_t{1} : int32_t{-1};
+        return StoreTextFile(szPath, text, kUnit) ? int32_t{1} : int32_t{-1};
     });
 }
 
@@ -186,7 +167,7 @@ XAVO_PLATFORM_API int32_t ORLICFileSetSection(const char *szPath, const char *sz
     }
     return XAVO_GUARD(int32_t{-1}, [&] {
         std::string text;
-        if (!Load(szPath, true, &text, __LINE__)) return int32_t{-1};
+        if (!LoadTextFile(szPath, true, &text, kUnit, __LINE__)) return int32_t{-1};
         Document doc(text);
         // Renaming onto another existing section would merge two printers'
         // records; refuse it.
@@ -203,7 +184,7 @@ XAVO_PLATFORM_API int32_t ORLICFileSetSection(const char *szPath, const char *sz
         if (found.empty()) {
             EndWithNewline(&text);
             text += section;
-            return Store(szPath, text) ? int32_t{1} : int32_t{-1};
+            return StoreTextFile(szPath, text, kUnit) ? int32_t{1} : int32_t{-1};
         }
         // The new section takes the place of the first one of the old name;
         // further ones of that name (which readers merge into it) go, so
@@ -220,7 +201,7 @@ XAVO_PLATFORM_API int32_t ORLICFileSetSection(const char *szPath, const char *sz
                 doc.lines.erase(first, last);
             }
         }
-        return Store(szPath, doc.Text()) ? int32_t{1} : int32_t{-1};
+        return StoreTextFile(szPath, JoinLines(doc.lines), kUnit) ? int32_t{1} : int32_t{-1};
     });
 }
 
@@ -232,30 +213,17 @@ XAVO_PLATFORM_API int32_t ORLICFileGetSectionValue(const char *szPath, const cha
         return -1;
     }
     return XAVO_GUARD(int32_t{-1}, [&] {
-        std::string text;
-        if (!Load(szPath, false, &text, __LINE__)) return int32_t{-1};
-        Document doc(text);
-        auto found = doc.Named(szSection);
-        if (found.empty()) {
-            SetError(kErrNotFound, kUnit, __LINE__);
-            return int32_t{-1};
-        }
-        std::optional<std::string> value;
-        for (const Section *s : found) {
-            for (size_t i = s->header + 1; i < s->bodyEnd; ++i) {
-                auto kv = ParseSectionKeyLine(doc.lines[i]);
-                if (kv && kv->key == szKey) value = std::string(kv->value);
-            }
+        auto doc = LoadWithSection(szPath, szSection, __LINE__);
+        if (!doc) return int32_t{-1};
+        std::optional<std::string_view> value;
+        for (const auto &[i, kv] : doc->KeyLines(doc->Named(szSection))) {
+            if (kv.key == szKey) value = kv.value;
         }
         if (!value) {
             SetError(kErrKeyNotFound, kUnit, __LINE__);
             return int32_t{-1};
         }
-        // Longer values are cut to fit, as fixed-size fields are.
-        size_t n = std::min(value->size(), static_cast<size_t>(cbBuf) - 1);
-        std::memcpy(szBuf, value->data(), n);
-        szBuf[n] = '\0';
-        return static_cast<int32_t>(n);
+        return CopyValue(*value, szBuf, cbBuf);
     });
 }
 
@@ -267,34 +235,26 @@ XAVO_PLATFORM_API int32_t ORLICFileSetSectionValue(const char *szPath, const cha
         return -1;
     }
     return XAVO_GUARD(int32_t{-1}, [&] {
-        std::string text;
-        if (!Load(szPath, false, &text, __LINE__)) return int32_t{-1};
-        Document doc(text);
-        auto found = doc.Named(szSection);
         // Only an existing section gets the key: a section made up here
         // would be a record of a printer nobody set up.
-        if (found.empty()) {
-            SetError(kErrNotFound, kUnit, __LINE__);
-            return int32_t{-1};
-        }
+        auto doc = LoadWithSection(szPath, szSection, __LINE__);
+        if (!doc) return int32_t{-1};
+        auto found = doc->Named(szSection);
         std::string line;
         FormatLine(kSingleKeyFormat, szKey, CleanValue(szValue), &line);
         // The line in force is the key's last one (readers keep the last
         // value); without one the key goes after the last section's keys.
         std::optional<size_t> at;
-        for (const Section *s : found) {
-            for (size_t i = s->header + 1; i < s->bodyEnd; ++i) {
-                auto kv = ParseSectionKeyLine(doc.lines[i]);
-                if (kv && kv->key == szKey) at = i;
-            }
+        for (const auto &[i, kv] : doc->KeyLines(found)) {
+            if (kv.key == szKey) at = i;
         }
         if (at) {
-            doc.lines[*at] = line;
+            doc->lines[*at] = line;
         } else {
             size_t after = found.back()->bodyEnd;
-            EndWithNewline(&doc.lines[after - 1]);
-            doc.lines.insert(doc.lines.begin() + static_cast<std::ptrdiff_t>(after), line);
+            EndWithNewline(&doc->lines[after - 1]);
+            doc->lines.insert(doc->lines.begin() + static_cast<std::ptrdiff_t>(after), line);
         }
-        return Store(szPath, doc.Text()) ? int32_t{0} : int32_t{-1};
+        return StoreTextFile(szPath, JoinLines(doc->lines), kUnit) ? int32_t{0} : int32_t{-1};
     });
 }
