@@ -11,8 +11,10 @@
 
 #include "appliance/standin_control.h"
 #include "sandbox/cupsd.h"
-#include "support/logs.h"
 #include "sandbox/socket_listener.h"
+#include "support/cases.h"
+#include "support/fault_sweep.h"
+#include "support/logs.h"
 #include "xavoprinter.h"
 
 using ::testing::ElementsAre;
@@ -20,11 +22,16 @@ using ::testing::ElementsAreArray;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
 using ::testing::StartsWith;
+using xavo::test::Calls;
+using xavo::test::CaseName;
 using xavo::test::FileExists;
+using xavo::test::Lines;
 using xavo::test::Logs;
 using xavo::test::PlaceFile;
 using xavo::test::PlaceProgram;
+using xavo::test::PlaceRecorder;
 using xavo::test::ReadFile;
+using xavo::test::RecordedArgs;
 
 namespace {
 
@@ -34,32 +41,14 @@ constexpr char kQueue[] = "usbprinter1";
 constexpr char kTestPage[] = "/usr/share/cups/data/testprint";
 constexpr char kSpool[] = "/var/services/printer";
 
+// Adds the printer's section; the real-scheduler tests share one sandbox,
+// where a section from an earlier test is left as it is.
 void SetCupsName(const std::string &printerId, const std::string &queue) {
     ORLICSzHash *hash = ORLICSzHashAlloc(512);
     ORLICSzHashSetValue(&hash, "cups printer name", queue.c_str());
     ORLICFileAddSection(kConf, printerId.c_str(), hash, "\t%s = %s\n");
     ORLICSzHashFree(hash);
 }
-
-std::vector<std::string> Lines(const std::string &text) {
-    std::vector<std::string> out;
-    for (size_t pos = 0, nl; (nl = text.find('\n', pos)) != std::string::npos; pos = nl + 1) {
-        out.push_back(text.substr(pos, nl - pos));
-    }
-    return out;
-}
-
-// A program that writes each argument on a line of its own to
-// /tmp/<name>.argv, appends a line to /tmp/<name>.calls and exits with the
-// status kept in /tmp/<name>.exit (0 when there is none).
-void PlaceRecorder(const std::string &path, const std::string &name) {
-    PlaceProgram(path, "#!/bin/sh\n"
-                       "for a in \"$@\"; do printf '%s\\n' \"$a\"; done > /tmp/" + name + ".argv\n"
-                       "echo run >> /tmp/" + name + ".calls\n"
-                       "exit $(cat /tmp/" + name + ".exit 2>/dev/null || echo 0)\n");
-}
-
-int Calls(const std::string &name) { return static_cast<int>(Lines(ReadFile("/tmp/" + name + ".calls")).size()); }
 
 // ---- submission -------------------------------------------------------
 
@@ -85,27 +74,11 @@ TEST_P(PrintFileArgs, LprGetsExactlyTheOptionsAsked) {
     SetCupsName(kPrinter, kQueue);
     PlaceRecorder("/usr/bin/lpr", "lpr");
     EXPECT_EQ(XAVOPrinterCupsPrintFile(kPrinter, "/tmp/doc.pdf", c.szTitle, c.blRemove), 0);
-    EXPECT_THAT(Lines(ReadFile("/tmp/lpr.argv")), ElementsAreArray(c.args));
+    EXPECT_THAT(RecordedArgs("lpr"), ElementsAreArray(c.args));
     EXPECT_THAT(Logs(), IsEmpty());
 }
 
-INSTANTIATE_TEST_SUITE_P(Options, PrintFileArgs, ::testing::ValuesIn(kLprCases), [](const auto &p) {
-    std::string s = p.param.szName;
-    for (char &ch : s) if (!isalnum(static_cast<unsigned char>(ch))) ch = '_';
-    return s;
-});
-
-TEST(PrintFile, LprFailureSetsErrExecAndLogsTheResult) {
-    SetCupsName(kPrinter, kQueue);
-    PlaceRecorder("/usr/bin/lpr", "lpr");
-    PlaceFile("/tmp/lpr.exit", "4\n");
-    PlaceFile("/tmp/doc.pdf", "%PDF-1.4\n");
-    EXPECT_EQ(XAVOPrinterCupsPrintFile(kPrinter, "/tmp/doc.pdf", "t", 1), -1);
-    EXPECT_EQ(ORLICErrGet(), ERR_EXEC);
-    // The runner's result is lpr's exit status.
-    EXPECT_THAT(Logs(), ElementsAre("3 printer_cups_print_file:N execv error, cmd=/usr/bin/lpr, ret=4"));
-    EXPECT_TRUE(FileExists("/tmp/doc.pdf"));
-}
+INSTANTIATE_TEST_SUITE_P(Options, PrintFileArgs, ::testing::ValuesIn(kLprCases), CaseName());
 
 TEST(PrintFile, PrinterWithoutQueueNameNeverRunsLpr) {
     PlaceRecorder("/usr/bin/lpr", "lpr");
@@ -139,12 +112,13 @@ TEST(PrintTestPage, SubmitsTheSharedPageWithoutRemoveOrTitle) {
     SetCupsName(kPrinter, kQueue);
     PlaceRecorder("/usr/bin/lpr", "lpr");
     EXPECT_EQ(XAVOPrinterCupsPrintTestPage(kPrinter), 0);
-    EXPECT_THAT(Lines(ReadFile("/tmp/lpr.argv")), ElementsAre("-P", kQueue, kTestPage));
+    EXPECT_THAT(RecordedArgs("lpr"), ElementsAre("-P", kQueue, kTestPage));
 
-    PlaceFile("/tmp/lpr.exit", "1\n");
+    // A failed lpr: the runner's result in the line is lpr's exit status.
+    PlaceFile("/tmp/lpr.exit", "4\n");
     EXPECT_EQ(XAVOPrinterCupsPrintTestPage(kPrinter), -1);
     EXPECT_EQ(ORLICErrGet(), ERR_EXEC);
-    EXPECT_THAT(Logs(), ElementsAre("3 printer_cups_print_file:N execv error, cmd=/usr/bin/lpr, ret=1",
+    EXPECT_THAT(Logs(), ElementsAre("3 printer_cups_print_file:N execv error, cmd=/usr/bin/lpr, ret=4",
                                     std::string("3 printer_cups_print_test_page:N cannot print test page, printer id=") +
                                         kPrinter));
 }
@@ -153,31 +127,16 @@ TEST(PrintTestPage, SubmitsTheSharedPageWithoutRemoveOrTitle) {
 // reported as ERR_EXEC, every other left as the platform set it, nothing
 // leaked (the suite also runs under LeakSanitizer).
 TEST(PrintFileFaults, EveryPlatformFailureFailsTheSubmission) {
-    SetCupsName(kPrinter, kQueue);
-    PlaceRecorder("/usr/bin/lpr", "lpr");
-    PlaceFile("/tmp/doc.pdf", "%PDF-1.4\n");
-    int nFailed = 0;
-    for (int n = 1; n < 50; ++n) {
-        XavoStandinReset();
-        XavoStandinFailCall("*", n, 0x0E00);
-        int32_t r = XAVOPrinterCupsPrintFile(kPrinter, "/tmp/doc.pdf", "title", 1);
-        const char *szFailed = XavoStandinLastFailed();
-        uint32_t uCode = ORLICErrGet();
-        XavoStandinReset();
-        if (szFailed == nullptr) {
-            EXPECT_EQ(r, 0);
-            break;
-        }
-        ++nFailed;
-        EXPECT_EQ(r, -1) << szFailed;
-        if (std::string(szFailed) == "ORLICExecv") {
-            EXPECT_EQ(uCode, ERR_EXEC);
-        } else {
-            EXPECT_EQ(uCode, 0x0E00u) << szFailed;
-        }
-        Logs();
-    }
-    EXPECT_GE(nFailed, 2);
+    xavo::test::SweepFailures(
+        [] {
+            SetCupsName(kPrinter, kQueue);
+            PlaceRecorder("/usr/bin/lpr", "lpr");
+        },
+        [] { return XAVOPrinterCupsPrintFile(kPrinter, "/tmp/doc.pdf", "title", 1); },
+        [](const std::string &failed, int32_t result) {
+            EXPECT_EQ(result, -1);
+            EXPECT_EQ(ORLICErrGet(), failed == "ORLICExecv" ? ERR_EXEC : xavo::test::kInjectedCode);
+        });
 }
 
 // ---- job listings -------------------------------------------------------
@@ -249,7 +208,7 @@ TEST_P(JobWaitListing, AnswersWhetherTheJobIsListed) {
     PlaceLpq(c.listing);
     Logs();
     EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(kPrinter, c.szJobId), c.result);
-    EXPECT_THAT(Lines(ReadFile("/tmp/lpq.argv")), ElementsAre("-P", kQueue));
+    EXPECT_THAT(RecordedArgs("lpq"), ElementsAre("-P", kQueue));
     EXPECT_EQ(Calls("lpq"), 1);
     EXPECT_THAT(xavo::test::TakeSleeps(), IsEmpty());
     std::vector<std::string> logs = Logs();
@@ -261,11 +220,7 @@ TEST_P(JobWaitListing, AnswersWhetherTheJobIsListed) {
     }
 }
 
-INSTANTIATE_TEST_SUITE_P(Listings, JobWaitListing, ::testing::ValuesIn(kListingCases), [](const auto &p) {
-    std::string s = p.param.szName;
-    for (char &ch : s) if (!isalnum(static_cast<unsigned char>(ch))) ch = '_';
-    return s;
-});
+INSTANTIATE_TEST_SUITE_P(Listings, JobWaitListing, ::testing::ValuesIn(kListingCases), CaseName());
 
 void Ignore(int) {}
 
@@ -370,7 +325,7 @@ TEST(CleanSpool, RemovesEveryNameWithADotAsAPlainName) {
     for (const std::string &f : kept) PlaceFile(std::string(kSpool) + "/" + f, "data");
 
     EXPECT_EQ(XAVOPrinterCleanSpool(), 0);
-    EXPECT_THAT(Lines(ReadFile("/tmp/lprm.argv")), ElementsAre("all"));
+    EXPECT_THAT(RecordedArgs("lprm"), ElementsAre("all"));
     for (const std::string &f : removed) EXPECT_FALSE(FileExists(std::string(kSpool) + "/" + f)) << f;
     for (const std::string &f : kept) EXPECT_TRUE(FileExists(std::string(kSpool) + "/" + f)) << f;
     EXPECT_FALSE(FileExists(std::string(kSpool) + "/dir.d"));
@@ -385,8 +340,7 @@ TEST(CleanSpool, RemovesEveryNameWithADotAsAPlainName) {
 }
 
 TEST(CleanSpool, LprmFailureIsOnlyLoggedAndEmptySpoolSucceeds) {
-    PlaceRecorder("/usr/bin/lprm", "lprm");
-    PlaceFile("/tmp/lprm.exit", "1\n");
+    PlaceRecorder("/usr/bin/lprm", "lprm", 1);
     for (bool bDirExists : {false, true}) {
         if (bDirExists) mkdir(kSpool, 0755);
         EXPECT_EQ(XAVOPrinterCleanSpool(), 0);
@@ -399,10 +353,9 @@ TEST(CleanSpool, LprmFailureIsOnlyLoggedAndEmptySpoolSucceeds) {
 TEST(CleanSpool, RmFailureFailsWithThePlatformsError) {
     PlaceRecorder("/usr/bin/lprm", "lprm");
     PlaceFile(std::string(kSpool) + "/job.ps", "x");
-    PlaceRecorder("/bin/rm", "rm");
-    PlaceFile("/tmp/rm.exit", "1\n");
+    PlaceRecorder("/bin/rm", "rm", 1);
     EXPECT_EQ(XAVOPrinterCleanSpool(), -1);
-    EXPECT_THAT(Lines(ReadFile("/tmp/rm.argv")), ElementsAre("-rf", std::string(kSpool) + "/job.ps"));
+    EXPECT_THAT(RecordedArgs("rm"), ElementsAre("-rf", std::string(kSpool) + "/job.ps"));
     std::vector<std::string> logs = Logs();
     ASSERT_EQ(logs.size(), 1u);
     EXPECT_THAT(logs[0], StartsWith("3 printer_clean_spool:N remove /var/services/printer failed. [0x"));
