@@ -8,6 +8,8 @@
 #include <cerrno>
 #include <cstring>
 
+#include "common/fd.h"
+
 namespace xavo::platform {
 namespace {
 
@@ -15,31 +17,6 @@ namespace {
 // of them, and reading it whole would only exhaust a small appliance.
 constexpr off_t kMaxFileSize = 16 * 1024 * 1024;
 constexpr mode_t kNewFileMode = 0644;
-
-class OwnedFd {
-public:
-    explicit OwnedFd(int fd) : fd_(fd) {}
-    OwnedFd(const OwnedFd &) = delete;
-    OwnedFd &operator=(const OwnedFd &) = delete;
-    ~OwnedFd() {
-        if (fd_ >= 0) {
-            int saved = errno;
-            ::close(fd_);
-            errno = saved;
-        }
-    }
-    int get() const { return fd_; }
-    // Closes now and reports the result: a failed close of a written file
-    // can be the first sign of a lost write.
-    int Close() {
-        int fd = fd_;
-        fd_ = -1;
-        return ::close(fd);
-    }
-
-private:
-    int fd_;
-};
 
 // The temporary file of a replacement, removed unless it was renamed into
 // place.
@@ -94,7 +71,7 @@ bool IsBlank(char c) { return c == ' ' || c == '\t' || c == '\r' || c == '\n' ||
 ReadResult ReadTextFile(const char *szPath, std::string *pText) {
     // O_NONBLOCK: a FIFO planted at the path must not hang the reader; it is
     // refused below like any other non-regular file.
-    OwnedFd fd(::open(szPath, O_RDONLY | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
+    Fd fd(::open(szPath, O_RDONLY | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
     if (fd.get() < 0) return errno == ENOENT ? ReadResult::kMissing : ReadResult::kFailed;
     struct stat st {};
     if (::fstat(fd.get(), &st) != 0) return ReadResult::kFailed;
@@ -149,7 +126,7 @@ bool ReplaceFile(const char *szPath, std::string_view content, Failure *pFailure
     // is not cleaned up later because nobody can tell it from the one a
     // live writer is filling.
     std::string tmpl = DirName(path) + "/." + BaseName(path) + ".XXXXXX";
-    OwnedFd fd(::mkostemp(tmpl.data(), O_CLOEXEC));
+    Fd fd(::mkostemp(tmpl.data(), O_CLOEXEC));
     if (fd.get() < 0) {
         *pFailure = {kErrOpen, __LINE__};
         return false;
@@ -184,7 +161,7 @@ bool ReplaceFile(const char *szPath, std::string_view content, Failure *pFailure
     temp.Commit();
     // Make the rename itself durable; the new content is in place already,
     // so a failure here is not reported.
-    OwnedFd dir(::open(DirName(path).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    Fd dir(::open(DirName(path).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
     if (dir.get() >= 0) ::fsync(dir.get());
     return true;
 }

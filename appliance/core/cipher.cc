@@ -24,6 +24,7 @@
 #include <vector>
 
 #include "common/appliance.h"
+#include "common/fd.h"
 
 using namespace xavo::platform;
 
@@ -56,20 +57,6 @@ struct Secret {
     ~Secret() {
         if (!bytes.empty()) sodium_memzero(bytes.data(), bytes.size());
     }
-};
-
-class Fd {
-public:
-    explicit Fd(int fd) : fd_(fd) {}
-    Fd(const Fd &) = delete;
-    Fd &operator=(const Fd &) = delete;
-    ~Fd() {
-        if (fd_ >= 0) ::close(fd_);
-    }
-    int get() const { return fd_; }
-
-private:
-    int fd_;
 };
 
 bool ReadExactly(int fd, unsigned char *p, size_t n) {

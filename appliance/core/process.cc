@@ -41,6 +41,7 @@
 #include <thread>
 #include <vector>
 
+#include "common/fd.h"
 #include "common/text_files.h"
 #include "core/internal.h"
 
@@ -129,28 +130,6 @@ private:
 };
 
 // ---- spawning -------------------------------------------------------------
-
-class Fd {
-public:
-    Fd() = default;
-    explicit Fd(int fd) : fd_(fd) {}
-    Fd(const Fd &) = delete;
-    Fd &operator=(const Fd &) = delete;
-    ~Fd() { reset(); }
-    int get() const { return fd_; }
-    int release() { return std::exchange(fd_, -1); }
-    void reset(int fd = -1) {
-        if (fd_ >= 0) {
-            int saved = errno;
-            ::close(fd_);
-            errno = saved;
-        }
-        fd_ = fd;
-    }
-
-private:
-    int fd_ = -1;
-};
 
 enum class Stdout { kInherit, kDiscard, kPipe };
 
@@ -276,19 +255,23 @@ int32_t Report(int32_t result, const Failure &failure) {
 struct VarArgs {
     const char *args[kMaxArgs];
     size_t count = 0;
-    bool ok = false;
+
+    // The program's argument vector: the program, then these arguments.
+    std::vector<std::string> Argv(const char *szProgram) const {
+        std::vector<std::string> argv{szProgram};
+        argv.insert(argv.end(), args, args + count);
+        return argv;
+    }
 };
 
-void CollectArgs(va_list ap, VarArgs *pArgs) {
-    for (pArgs->count = 0; pArgs->count <= kMaxArgs; ++pArgs->count) {
+// False when the list has no closing NULL within kMaxArgs.
+bool CollectArgs(va_list ap, VarArgs *pArgs) {
+    for (pArgs->count = 0; pArgs->count < kMaxArgs; ++pArgs->count) {
         const char *arg = va_arg(ap, const char *);
-        if (arg == nullptr) {
-            pArgs->ok = true;
-            return;
-        }
-        if (pArgs->count == kMaxArgs) return;
+        if (arg == nullptr) return true;
         pArgs->args[pArgs->count] = arg;
     }
+    return va_arg(ap, const char *) == nullptr;
 }
 
 // ORLICExec expands an argument as a file name pattern when it is an
@@ -442,25 +425,19 @@ XAVO_PLATFORM_API int32_t ORLICExec(const char *szProgram, const char *szArg1, c
 
 XAVO_PLATFORM_API int32_t ORLICExecl(const char *szProgram, uint32_t uOptions, ...) {
     if (XAVO_INJECTED()) return kNotRun;
-    if (szProgram == nullptr || szProgram[0] == '\0') {
-        SetError(kErrBadParameters, kUnit, __LINE__);
-        return kNotRun;
-    }
     VarArgs args;
     va_list ap;
     va_start(ap, uOptions);
-    CollectArgs(ap, &args);
+    bool bArgsOk = CollectArgs(ap, &args);
     va_end(ap);
-    if (!args.ok) {
+    if (szProgram == nullptr || szProgram[0] == '\0' || !bArgsOk) {
         SetError(kErrBadParameters, kUnit, __LINE__);
         return kNotRun;
     }
     return XAVO_GUARD(kNotRun, [&] {
-        std::vector<std::string> argv{szProgram};
-        argv.insert(argv.end(), args.args, args.args + args.count);
         Failure failure;
         Stdout out = (uOptions & kExeclQuiet) != 0 ? Stdout::kDiscard : Stdout::kInherit;
-        return Report(Run(szProgram, argv, out, (uOptions & kExeclWait) != 0, &failure), failure);
+        return Report(Run(szProgram, args.Argv(szProgram), out, (uOptions & kExeclWait) != 0, &failure), failure);
     });
 }
 
@@ -486,24 +463,20 @@ XAVO_PLATFORM_API int32_t ORLICExecv(const char *szProgram, char *const apszArgv
 
 XAVO_PLATFORM_API FILE *ORLICPopen(const char *szProgram, const char *szMode, ...) {
     if (XAVO_INJECTED()) return nullptr;
-    // Only reading a program's output is offered; nothing of the appliance
-    // writes into a program.
-    if (szProgram == nullptr || szProgram[0] == '\0' || szMode == nullptr || std::strcmp(szMode, "r") != 0) {
-        SetError(kErrBadParameters, kUnit, __LINE__);
-        return nullptr;
-    }
     VarArgs args;
     va_list ap;
     va_start(ap, szMode);
-    CollectArgs(ap, &args);
+    bool bArgsOk = CollectArgs(ap, &args);
     va_end(ap);
-    if (!args.ok) {
+    // Only reading a program's output is offered; nothing of the appliance
+    // writes into a program.
+    if (szProgram == nullptr || szProgram[0] == '\0' || szMode == nullptr || std::strcmp(szMode, "r") != 0 ||
+        !bArgsOk) {
         SetError(kErrBadParameters, kUnit, __LINE__);
         return nullptr;
     }
     return XAVO_GUARD(static_cast<FILE *>(nullptr), [&]() -> FILE * {
-        std::vector<std::string> argv{szProgram};
-        argv.insert(argv.end(), args.args, args.args + args.count);
+        const std::vector<std::string> argv = args.Argv(szProgram);
         Streams &streams = OpenStreams();
         std::lock_guard guard(streams.mutex);
         auto [slot, bNew] = streams.children.try_emplace(nullptr, -1);
