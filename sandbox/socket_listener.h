@@ -1,5 +1,5 @@
 // A printer on loopback for the printing tests: accepts TCP connections on
-// 127.0.0.1 (the port the kernel picks) and keeps every byte sent to it,
+// 127.0.0.1 (the port the kernel picks, or a given one) and keeps every byte sent to it,
 // like a JetDirect "socket" printer.  CUPS's socket backend prints to it
 // with the device URI "socket://127.0.0.1:<Port()>".
 //
@@ -28,11 +28,16 @@ namespace xavo::test {
 
 class SocketListener {
 public:
-    SocketListener() {
+    // Port 0: the kernel picks one.  A fixed port (9100, the JetDirect
+    // port) is free in the sandbox's own network.
+    explicit SocketListener(std::uint16_t port = 0) {
         fd_ = socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);
+        const int reuse = 1;
+        if (fd_ >= 0) setsockopt(fd_, SOL_SOCKET, SO_REUSEADDR, &reuse, sizeof reuse);
         sockaddr_in addr{};
         addr.sin_family = AF_INET;
         addr.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+        addr.sin_port = htons(port);
         socklen_t len = sizeof addr;
         if (fd_ < 0 || bind(fd_, reinterpret_cast<sockaddr *>(&addr), sizeof addr) != 0 || listen(fd_, 4) != 0 ||
             getsockname(fd_, reinterpret_cast<sockaddr *>(&addr), &len) != 0) {
