@@ -9,7 +9,7 @@ cd "$(dirname "$0")/.."
 prefix=${1:-$PWD/_install}
 
 bash scripts/install-deps.sh
-cmake -S . -B build/release -G Ninja -DCMAKE_BUILD_TYPE=Release -DXAVO_BUILD_TESTS=OFF \
+cmake -S . -B build/release -G Ninja -DCMAKE_BUILD_TYPE=Release -DXAVO_BUILD_TESTS=OFF -DXAVO_BUILD_DEMO=OFF \
       -DCMAKE_INSTALL_PREFIX="$prefix" >/dev/null
 cmake --build build/release -j "$(nproc)"
 cmake --install build/release >/dev/null
