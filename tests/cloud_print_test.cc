@@ -6,12 +6,16 @@
 #include <cstring>
 #include <map>
 #include <string>
+#include <vector>
 
 #include "appliance/standin_control.h"
+#include "support/cases.h"
+#include "support/fault_sweep.h"
 #include "support/logs.h"
 #include "support/sections.h"
 #include "xavoprinter.h"
 
+using ::testing::AllOf;
 using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
@@ -59,49 +63,48 @@ std::string Show(const PrinterGoogleInfo &info) {
 constexpr char kPassword[] = "pa55-Word_of_the_owner";
 constexpr char kToken[] = "1//0refresh-token-of-the-account";
 
-TEST(CloudPrintState, PasswordIsStoredEncipheredAndComesBack) {
-    PrinterGoogleInfo in = Info("owner@example.com", kPassword, "");
-    ASSERT_EQ(XAVOPrinterGoogleInfoSet(&in), 0);
-    Section s = ReadSection();
-    EXPECT_EQ(s.size(), 2u);
-    EXPECT_EQ(s["google account"], "owner@example.com");
-    EXPECT_FALSE(s["google pass"].empty());
-    EXPECT_NE(s["google pass"], kPassword);
+// Records set one after another, and what is then stored and read back:
+// the secret in force is the one last given, a password winning over a
+// token in the same record; each is stored enciphered.
+struct StateCase {
+    const char *szName;
+    std::vector<PrinterGoogleInfo> sets;
+    bool bPassStored, bTokenStored;
+    bool bTokenKept;  // the token stored by the first set is still there
+    std::string shown;
+};
 
-    PrinterGoogleInfo out = Junk();
-    EXPECT_EQ(XAVOPrinterGoogleInfoGet(&out), 0);
-    EXPECT_EQ(Show(out), std::string("owner@example.com|") + kPassword + "|");
-    EXPECT_THAT(Logs(), IsEmpty());
-}
-
-TEST(CloudPrintState, TokenStoredOverAPasswordDeletesThePassword) {
-    PrinterGoogleInfo pass = Info("owner@example.com", kPassword, "");
-    ASSERT_EQ(XAVOPrinterGoogleInfoSet(&pass), 0);
-    PrinterGoogleInfo token = Info("owner@example.com", "", kToken);
-    ASSERT_EQ(XAVOPrinterGoogleInfoSet(&token), 0);
-    Section s = ReadSection();
-    EXPECT_EQ(s.count("google pass"), 0u);
-    EXPECT_FALSE(s["refresh token"].empty());
-
-    PrinterGoogleInfo out = Junk();
-    EXPECT_EQ(XAVOPrinterGoogleInfoGet(&out), 0);
-    EXPECT_EQ(Show(out), std::string("owner@example.com||") + kToken);
-}
-
-TEST(CloudPrintState, PasswordStoredOverATokenKeepsTheTokenButIsInForce) {
-    PrinterGoogleInfo token = Info("owner@example.com", "", kToken);
-    ASSERT_EQ(XAVOPrinterGoogleInfoSet(&token), 0);
-    const std::string storedToken = ReadSection()["refresh token"];
-    // Both secrets in the record: only the password is stored.
-    PrinterGoogleInfo both = Info("owner@example.com", kPassword, "another-token");
-    ASSERT_EQ(XAVOPrinterGoogleInfoSet(&both), 0);
-    Section s = ReadSection();
-    EXPECT_EQ(s["refresh token"], storedToken);
-    EXPECT_FALSE(s["google pass"].empty());
-
-    PrinterGoogleInfo out = Junk();
-    EXPECT_EQ(XAVOPrinterGoogleInfoGet(&out), 0);
-    EXPECT_EQ(Show(out), std::string("owner@example.com|") + kPassword + "|");
+TEST(CloudPrintState, SecretInForceIsTheLastGivenAndComesBackDeciphered) {
+    const std::string account = "owner@example.com";
+    const PrinterGoogleInfo pass = Info(account.c_str(), kPassword, ""), token = Info(account.c_str(), "", kToken);
+    const StateCase cases[] = {
+        {"password", {pass}, true, false, false, account + "|" + kPassword + "|"},
+        {"token over a password deletes it", {pass, token}, false, true, false, account + "||" + kToken},
+        {"password over a token keeps it", {token, Info(account.c_str(), kPassword, "another-token")}, true, true,
+         true, account + "|" + kPassword + "|"},
+    };
+    for (const StateCase &c : cases) {
+        SCOPED_TRACE(c.szName);
+        xavo::test::ResetSandbox();
+        Section first;
+        for (PrinterGoogleInfo in : c.sets) {
+            ASSERT_EQ(XAVOPrinterGoogleInfoSet(&in), 0);
+            if (first.empty()) first = ReadSection();
+        }
+        Section s = ReadSection();
+        EXPECT_EQ(s.size(), 1u + c.bPassStored + c.bTokenStored);
+        EXPECT_EQ(s["google account"], account);
+        EXPECT_EQ(s.count("google pass"), c.bPassStored ? 1u : 0u);
+        EXPECT_THAT(xavo::test::ReadFile(kConf), AllOf(Not(HasSubstr(kPassword)), Not(HasSubstr(kToken))));
+        EXPECT_EQ(s.count("refresh token"), c.bTokenStored ? 1u : 0u);
+        if (c.bTokenKept) {
+            EXPECT_EQ(s["refresh token"], first["refresh token"]);
+        }
+        PrinterGoogleInfo out = Junk();
+        EXPECT_EQ(XAVOPrinterGoogleInfoGet(&out), 0);
+        EXPECT_EQ(Show(out), c.shown);
+        EXPECT_THAT(Logs(), IsEmpty());
+    }
 }
 
 TEST(CloudPrintState, KeysOfOtherServicesSurviveASet) {
@@ -123,31 +126,6 @@ TEST(CloudPrintState, UnterminatedFieldsAreReadToTheirWidthAndCutOnTheWayBack) {
     EXPECT_EQ(ReadSection()["google account"], std::string(255, 'p'));
     ASSERT_EQ(XAVOPrinterGoogleInfoGet(&out), 0);
     EXPECT_EQ(Show(out), std::string(254, 'p') + "|" + std::string(127, 'p') + "|");
-}
-
-TEST(CloudPrintState, ClearSecretsNeverReachTheFileOrTheLog) {
-    PrinterGoogleInfo pass = Info("owner@example.com", kPassword, "");
-    ASSERT_EQ(XAVOPrinterGoogleInfoSet(&pass), 0);
-    PrinterGoogleInfo token = Info("owner@example.com", "", kToken);
-    ASSERT_EQ(XAVOPrinterGoogleInfoSet(&token), 0);
-    // A damaged store and a refused write log too: none of it may carry a
-    // secret.
-    Section s = ReadSection();
-    s["refresh token"][3] ^= 0x01;
-    WriteSection(s);
-    PrinterGoogleInfo out;
-    EXPECT_EQ(XAVOPrinterGoogleInfoGet(&out), -1);
-    XavoStandinFailCall("ORLICFileAddSection", 1, 0x0B00);
-    EXPECT_LT(XAVOPrinterGoogleInfoSet(&pass), 0);
-    XavoStandinReset();
-
-    const std::string file = xavo::test::ReadFile(kConf);
-    EXPECT_THAT(file, Not(HasSubstr(kPassword)));
-    EXPECT_THAT(file, Not(HasSubstr(kToken)));
-    for (const xavo::test::LogLine &l : xavo::test::TakeLogs()) {
-        EXPECT_THAT(l.message, Not(HasSubstr(kPassword)));
-        EXPECT_THAT(l.message, Not(HasSubstr(kToken)));
-    }
 }
 
 // ---- reading -------------------------------------------------------------
@@ -202,23 +180,9 @@ TEST_P(CloudPrintGetFailure, FailsWithTheRecordCleared) {
     }
 }
 
-INSTANTIATE_TEST_SUITE_P(Stores, CloudPrintGetFailure, ::testing::ValuesIn(kGetFailures),
-                         [](const auto &p) {
-                             std::string s = p.param.szName;
-                             for (char &ch : s) if (!isalnum(static_cast<unsigned char>(ch))) ch = '_';
-                             return s;
-                         });
+INSTANTIATE_TEST_SUITE_P(Stores, CloudPrintGetFailure, ::testing::ValuesIn(kGetFailures), xavo::test::CaseName());
 
 // ---- writing -------------------------------------------------------------
-
-TEST(CloudPrintSet, EmptyAccountLeavesTheFileUntouched) {
-    WriteSection({{"google account", "kept@example.com"}, {"google pass", "cipher"}});
-    const std::string before = xavo::test::ReadFile(kConf);
-    PrinterGoogleInfo in = Info("", kPassword, kToken);
-    EXPECT_EQ(XAVOPrinterGoogleInfoSet(&in), -1);
-    EXPECT_EQ(xavo::test::ReadFile(kConf), before);
-    EXPECT_THAT(Logs(), ElementsAre("3 printer_google_info_set:N google account can't be empty"));
-}
 
 TEST(CloudPrintArguments, NullRecordFailsSilentlyWithBadParameters) {
     EXPECT_EQ(XAVOPrinterGoogleInfoGet(nullptr), -1);
@@ -229,81 +193,77 @@ TEST(CloudPrintArguments, NullRecordFailsSilentlyWithBadParameters) {
     EXPECT_THAT(Logs(), IsEmpty());
 }
 
-TEST(CloudPrintSet, PrinterLockNotTakenFailsWithErrLockAndWritesNothing) {
-    WriteSection({{"google account", "kept@example.com"}});
-    const std::string before = xavo::test::ReadFile(kConf);
-    XavoStandinFailCalls("ORLICFileLockByFile", 1, -1, 0x0E00);
-    PrinterGoogleInfo in = Info("owner@example.com", kPassword, "");
-    EXPECT_EQ(XAVOPrinterGoogleInfoSet(&in), -1);
-    EXPECT_EQ(ORLICErrGet(), ERR_LOCK);
-    XavoStandinReset();
-    EXPECT_EQ(xavo::test::ReadFile(kConf), before);
-    EXPECT_THAT(Logs(), IsEmpty());
+TEST(CloudPrintSet, EmptyAccountOrNoPrinterLockLeavesTheFileUntouched) {
+    struct {
+        const char *szAccount;
+        bool bLockFails;
+        std::vector<std::string> logs;
+    } const cases[] = {{"", false, {"3 printer_google_info_set:N google account can't be empty"}},
+                       {"owner@example.com", true, {}}};
+    for (const auto &c : cases) {
+        WriteSection({{"google account", "kept@example.com"}, {"google pass", "cipher"}});
+        const std::string before = xavo::test::ReadFile(kConf);
+        if (c.bLockFails) XavoStandinFailCalls("ORLICFileLockByFile", 1, -1, 0x0E00);
+        PrinterGoogleInfo in = Info(c.szAccount, kPassword, kToken);
+        EXPECT_EQ(XAVOPrinterGoogleInfoSet(&in), -1) << c.szAccount;
+        if (c.bLockFails) {
+            EXPECT_EQ(ORLICErrGet(), ERR_LOCK);
+        }
+        XavoStandinReset();
+        EXPECT_EQ(xavo::test::ReadFile(kConf), before);
+        EXPECT_EQ(Logs(), c.logs);
+    }
 }
 
 // Every platform call of a set or a get failed in turn: the operation
-// fails, nothing but the call's own line is logged, the stored account is
-// either the old one or the new one, and the printer lock is free again.
+// fails (or rides the failure out, a repeated lock try or an old section
+// read as empty, and stores the new account), the stored account is the
+// old one or the new one, no clear secret is written, and the printer
+// lock is free again.
 TEST(CloudPrintFaults, EveryPlatformFailureIsACleanFailure) {
-    constexpr uint32_t kInjected = 0x0E00;
     const std::string oldFile = [] {
         PrinterGoogleInfo old = Info("old@example.com", "old-pass", "");
         EXPECT_EQ(XAVOPrinterGoogleInfoSet(&old), 0);
         return xavo::test::ReadFile(kConf);
     }();
     PrinterGoogleInfo in = Info("new@example.com", "", kToken);
-    int nFailed = 0;
-    for (int n = 1; n < 200; ++n) {
-        xavo::test::PlaceFile(kConf, oldFile);
-        XavoStandinReset();
-        XavoStandinFailCall("*", n, kInjected);
-        int32_t r = XAVOPrinterGoogleInfoSet(&in);
-        const char *szFailed = XavoStandinLastFailed();
-        XavoStandinReset();
-        if (szFailed == nullptr) {
-            EXPECT_EQ(r, 0);
-            break;
-        }
-        ++nFailed;
-        const std::string op = szFailed;
-        const std::string file = xavo::test::ReadFile(kConf);
-        // Failures the set rides out (a lock try that is repeated, a read
-        // of the old section that comes back empty) must still store the
-        // new account; every other failure leaves the old file.
-        if (r == 0) {
-            EXPECT_THAT(file, HasSubstr("new@example.com")) << op;
-        } else {
-            EXPECT_LT(r, 0) << op;
-            EXPECT_EQ(file, oldFile) << op;
-        }
-        EXPECT_THAT(file, Not(HasSubstr(kToken))) << op;
-        int fd = XAVOPrinterPrinterConfLock();
-        EXPECT_GE(fd, 0) << "lock left held after " << op;
-        XAVOPrinterPrinterConfUnlock(fd);
-        Logs();
-    }
-    EXPECT_GT(nFailed, 4);
-
-    for (int n = 1; n < 200; ++n) {
-        XavoStandinReset();
-        XavoStandinFailCall("*", n, kInjected);
-        PrinterGoogleInfo out = Junk();
-        int32_t r = XAVOPrinterGoogleInfoGet(&out);
-        const char *szFailed = XavoStandinLastFailed();
-        const uint32_t uCode = ORLICErrGet();
-        XavoStandinReset();
-        if (szFailed == nullptr) {
-            EXPECT_EQ(r, 0);
-            break;
-        }
-        EXPECT_EQ(r, -1) << szFailed;
-        EXPECT_EQ(out.szPassword[0], '\0') << szFailed;
-        EXPECT_EQ(out.szRefreshToken[0], '\0') << szFailed;
-        if (std::string(szFailed) == "ORLICSzHashAlloc") {
-            EXPECT_EQ(uCode, ERR_OUT_OF_MEMORY);
-        }
-        Logs();
-    }
+    xavo::test::SweepFailures([&] { xavo::test::PlaceFile(kConf, oldFile); },
+                              [&] { return XAVOPrinterGoogleInfoSet(&in); },
+                              [&](const std::string &, int32_t result) {
+                                  const std::string file = xavo::test::ReadFile(kConf);
+                                  if (result == 0) {
+                                      EXPECT_THAT(file, HasSubstr("new@example.com"));
+                                  } else {
+                                      EXPECT_LT(result, 0);
+                                      EXPECT_EQ(file, oldFile);
+                                  }
+                                  EXPECT_THAT(file, Not(HasSubstr(kToken)));
+                                  for (const xavo::test::LogLine &l : xavo::test::TakeLogs()) {
+                                      EXPECT_THAT(l.message, Not(HasSubstr(kToken))) << "a clear secret logged";
+                                  }
+                                  int fd = XAVOPrinterPrinterConfLock();
+                                  EXPECT_GE(fd, 0) << "the printer lock was left held";
+                                  XAVOPrinterPrinterConfUnlock(fd);
+                              });
+    xavo::test::SweepFailures([&] { ASSERT_EQ(XAVOPrinterGoogleInfoSet(&in), 0); },
+                              [] {
+                                  PrinterGoogleInfo out = Junk();
+                                  int32_t result = XAVOPrinterGoogleInfoGet(&out);
+                                  if (result != 0) {  // no secret handed out by a failed read
+                                      EXPECT_EQ(out.szPassword[0], '\0');
+                                      EXPECT_EQ(out.szRefreshToken[0], '\0');
+                                  }
+                                  return result;
+                              },
+                              [](const std::string &failed, int32_t result) {
+                                  EXPECT_EQ(result, -1);
+                                  if (failed == "ORLICSzHashAlloc") {
+                                      EXPECT_EQ(ORLICErrGet(), ERR_OUT_OF_MEMORY);
+                                  }
+                                  for (const xavo::test::LogLine &l : xavo::test::TakeLogs()) {
+                                      EXPECT_THAT(l.message, Not(HasSubstr(kToken))) << "a clear secret logged";
+                                  }
+                              });
 }
 
 }  // namespace
