@@ -238,28 +238,20 @@ TEST(SyslogCapture, ParsesHeadersOfOtherSenders) {
 
 // ---- sleeps ---------------------------------------------------------------------
 
-TEST(CountedSleeps, AreRecordedAndReturnAtOnce) {
+TEST(CountedSleeps, ReturnAtOnceIntoOneListWithForkedChildrenAndWaitOnlyInRealMode) {
     const auto start = std::chrono::steady_clock::now();
     for (int i = 0; i < 100; ++i) ASSERT_EQ(XavoProbeUsleep(50000), 0);
-    ASSERT_EQ(XavoProbeSleep(8), 0u);
+    ASSERT_EQ(InChild([] { return XavoProbeSleep(8) == 0 && XavoProbeUsleep(3) == 0 ? 0 : 1; }), 0);
     EXPECT_LT(std::chrono::steady_clock::now() - start, 2s);
     std::vector<std::uint64_t> expected(100, 50000);
-    expected.push_back(8000000);
+    expected.insert(expected.end(), {8000000, 3});
     EXPECT_EQ(xt::TakeSleeps(), expected);
     EXPECT_TRUE(xt::TakeSleeps().empty());
-}
 
-TEST(CountedSleeps, ForkedChildRecordsIntoTheSameList) {
-    XavoProbeUsleep(1);
-    ASSERT_EQ(InChild([] { return XavoProbeSleep(2) == 0 && XavoProbeUsleep(3) == 0 ? 0 : 1; }), 0);
-    EXPECT_EQ(xt::TakeSleeps(), (std::vector<std::uint64_t>{1, 2000000, 3}));
-}
-
-TEST(CountedSleeps, RealModeWaitsAndStillRecords) {
     xt::SetRealSleep(true);
-    const auto start = std::chrono::steady_clock::now();
+    const auto real = std::chrono::steady_clock::now();
     EXPECT_EQ(XavoProbeUsleep(60000), 0);
-    EXPECT_GE(std::chrono::steady_clock::now() - start, 60ms);
+    EXPECT_GE(std::chrono::steady_clock::now() - real, 60ms);
     EXPECT_EQ(xt::TakeSleeps(), (std::vector<std::uint64_t>{60000}));
 }
 
@@ -313,41 +305,22 @@ TEST(SimulatedUsblp, OpenAnswersAsConfigured) {
     EXPECT_FALSE(xt::FileExists("/dev/usb/lp1"));
 }
 
+// The device ID and reset answers are pinned by the usblp device tests;
+// here what those cannot reach: other requests, and a device unplugged
+// under an open descriptor.
 TEST(SimulatedUsblp, RequestsAnswerAsTheDriverDoes) {
-    const std::string reply = xt::UsblpReply("MFG:ACME;MDL:Model 100;CMD:PCL;");
-    xt::SetUsblp("lp0", {.deviceIdFailures = 1, .deviceIdReply = reply, .resetAccepted = false});
+    xt::SetUsblp("lp0", {.deviceIdReply = xt::UsblpReply("MFG:ACME;")});
     const int fd = XavoProbeOpen("/dev/usb/lp0", O_RDONLY);
     ASSERT_GE(fd, 0);
     EXPECT_EQ(xt::GetUsblp("lp0").openNow, 1);
-
-    std::vector<char> buf(4095, 0);
+    std::vector<char> buf(64, 0);
     int flag = 1;
-    struct Step {
-        unsigned long request;
-        void *arg;
-        int errnoWanted;
-    };
-    const std::vector<Step> steps = {
-        {kDeviceId, buf.data(), EIO},  // the one configured failure
-        {kDeviceId, buf.data(), 0},    {kSoftReset, nullptr, EIO}, {kEnable, &flag, 0},
-        {kDisable, &flag, 0},          {TCGETS, buf.data(), ENOTTY},
-    };
-    for (const Step &s : steps) EXPECT_EQ(ErrnoOf(XavoProbeIoctl(fd, s.request, s.arg)), s.errnoWanted) << s.request;
-    EXPECT_EQ(std::string(buf.data(), reply.size() + 1), reply + '\0');
-
-    std::vector<std::uint32_t> numbers;
-    for (const Step &s : steps) numbers.push_back(static_cast<std::uint32_t>(s.request));
-    EXPECT_EQ(xt::GetUsblp("lp0").requests, numbers);
-
-    // Unplugged under the open descriptor; the reply of the next device is
-    // longer than any request may carry.
+    EXPECT_EQ(ErrnoOf(XavoProbeIoctl(fd, kEnable, &flag)), 0);
+    EXPECT_EQ(ErrnoOf(XavoProbeIoctl(fd, kDisable, &flag)), 0);
+    EXPECT_EQ(ErrnoOf(XavoProbeIoctl(fd, TCGETS, buf.data())), ENOTTY);
     xt::SetUsblp("lp0", {.present = false});
     EXPECT_EQ(ErrnoOf(XavoProbeIoctl(fd, kDeviceId, buf.data())), ENODEV);
-    xt::SetUsblp("lp0", {.deviceIdReply = xt::UsblpReply(std::string(5000, 'x'))});
-    EXPECT_EQ(XavoProbeIoctl(fd, kDeviceId, buf.data()), 0);
-    EXPECT_EQ(static_cast<unsigned char>(buf[0]) * 256 + static_cast<unsigned char>(buf[1]), 5002);
-    EXPECT_EQ(std::string(buf.data() + 2, 4093), std::string(4093, 'x'));
-    EXPECT_EQ(XavoProbeIoctl(fd, kSoftReset, nullptr), 0);
+    EXPECT_EQ(xt::GetUsblp("lp0").requests, (std::vector<std::uint32_t>{kEnable, kDisable, TCGETS, kDeviceId}));
     close(fd);
     EXPECT_EQ(xt::GetUsblp("lp0").openNow, 0);
 }
@@ -394,13 +367,10 @@ TEST(FakeSysfs, PlugShowsTheDeviceAndUnplugRemovesOnlyIt) {
         std::string path;
         std::string content;
     };
+    // The attributes the USB stand-in reads through /sys/class/usbmisc are
+    // pinned by its own tests; here the rest of the layout.
     const std::vector<Expect> files = {
         {usb1 + "1-1/idVendor", "04b8\n"},
-        {usb1 + "1-1/idProduct", "0005\n"},
-        {usb1 + "1-1/serial", "SN0001\n"},
-        {usb1 + "1-1/manufacturer", "ACME\n"},
-        {usb1 + "1-1/product", "Model 100\n"},
-        {usb1 + "1-1/1-1:1.0/bInterfaceClass", "07\n"},
         {"/sys/class/usbmisc/lp0/dev", "180:0\n"},
         {"/sys/class/usbmisc/lp0/device/bInterfaceClass", "07\n"},
         {"/sys/bus/usb/devices/1-1/idVendor", "04b8\n"},
