@@ -8,42 +8,27 @@
 #include <string>
 #include <vector>
 
+#include "support/cases.h"
 #include "support/logs.h"
 #include "xavoprinter.h"
 
 using ::testing::ElementsAre;
 using ::testing::ElementsAreArray;
 using ::testing::IsEmpty;
+using xavo::test::CaseName;
 using xavo::test::Logs;
 
 namespace {
 
 constexpr char kPrinter[] = "04b8:0005:SN0001";
-constexpr char kArgvFile[] = "/tmp/bind_driver.argv";
-constexpr char kExitFile[] = "/tmp/bind_driver.exit";
 
 void PlaceStatus(const std::string &szPrinterId, const std::string &content) {
     xavo::test::PlaceFile("/tmp/usbip_" + szPrinterId, content);
 }
 
-// The driver binding tool: writes each argument on a line of its own and
-// exits with the status kept in kExitFile (0 when there is none).
-void PlaceBindDriver(int iExit = 0) {
-    xavo::test::PlaceProgram("/usr/bin/bind_driver",
-                             "#!/bin/sh\n"
-                             "for a in \"$@\"; do printf '%s\\n' \"$a\"; done > /tmp/bind_driver.argv\n"
-                             "exit $(cat /tmp/bind_driver.exit 2>/dev/null || echo 0)\n");
-    if (iExit != 0) xavo::test::PlaceFile(kExitFile, std::to_string(iExit) + "\n");
-}
-
-std::vector<std::string> RecordedArgs() {
-    std::vector<std::string> out;
-    std::string text = xavo::test::ReadFile(kArgvFile);
-    for (size_t pos = 0, nl; (nl = text.find('\n', pos)) != std::string::npos; pos = nl + 1) {
-        out.push_back(text.substr(pos, nl - pos));
-    }
-    return out;
-}
+// The driver binding tool, recording its arguments.
+void PlaceBindDriver(int iExit = 0) { xavo::test::PlaceRecorder("/usr/bin/bind_driver", "bind_driver", iExit); }
+std::vector<std::string> RecordedArgs() { return xavo::test::RecordedArgs("bind_driver"); }
 
 // ---- lock status ------------------------------------------------------
 
@@ -76,12 +61,7 @@ TEST_P(UsbipLockStatus, AnswersZeroWithTheStatusOrFree) {
     EXPECT_THAT(Logs(), IsEmpty());
 }
 
-INSTANTIATE_TEST_SUITE_P(Files, UsbipLockStatus, ::testing::ValuesIn(kLockCases),
-                         [](const auto &p) {
-                             std::string s = p.param.szName;
-                             for (char &ch : s) if (!isalnum(static_cast<unsigned char>(ch))) ch = '_';
-                             return s;
-                         });
+INSTANTIATE_TEST_SUITE_P(Files, UsbipLockStatus, ::testing::ValuesIn(kLockCases), CaseName());
 
 TEST(UsbipLockStatusArguments, BadArgumentsFailSilentlyWithBadParameters) {
     char szBuf[16];
@@ -137,29 +117,22 @@ TEST_P(UsbipTool, PassesThePrinterIdAsOneArgument) {
     EXPECT_THAT(Logs(), IsEmpty());
 }
 
-TEST_P(UsbipTool, ToolFailureOrAbsenceLogsAndFails) {
+TEST_P(UsbipTool, BadPrinterIdNeverRunsTheToolAndItsFailureOrAbsenceFails) {
     const ToolCase &c = GetParam();
-    EXPECT_EQ(c.hook(kPrinter), -1);
+    EXPECT_EQ(c.hook(kPrinter), -1);  // no tool at all
     PlaceBindDriver(3);
-    EXPECT_EQ(c.hook(kPrinter), -1);
-    EXPECT_THAT(RecordedArgs(), ElementsAreArray(c.args(kPrinter)));
-    EXPECT_THAT(Logs(), ElementsAre(c.failureLog(kPrinter), c.failureLog(kPrinter)));
-}
-
-TEST_P(UsbipTool, NullOrEmptyPrinterIdNeverRunsTheTool) {
-    const ToolCase &c = GetParam();
-    PlaceBindDriver();
     for (const char *id : {static_cast<const char *>(nullptr), ""}) {
         ORLICErrSetEx(0, "test", 0);
         EXPECT_EQ(c.hook(id), -1);
         EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
     }
-    EXPECT_FALSE(xavo::test::FileExists(kArgvFile));
-    EXPECT_THAT(Logs(), IsEmpty());
+    EXPECT_EQ(xavo::test::Calls("bind_driver"), 0);
+    EXPECT_EQ(c.hook(kPrinter), -1);
+    EXPECT_THAT(RecordedArgs(), ElementsAreArray(c.args(kPrinter)));
+    EXPECT_THAT(Logs(), ElementsAre(c.failureLog(kPrinter), c.failureLog(kPrinter)));
 }
 
-INSTANTIATE_TEST_SUITE_P(Hooks, UsbipTool, ::testing::ValuesIn(kToolCases),
-                         [](const auto &p) { return std::string(p.param.szName); });
+INSTANTIATE_TEST_SUITE_P(Hooks, UsbipTool, ::testing::ValuesIn(kToolCases), CaseName());
 
 // ---- queue text ---------------------------------------------------------
 
@@ -202,12 +175,7 @@ TEST_P(QueueGet, RewritesTheRemarkToNameTheCupsJobs) {
     }
 }
 
-INSTANTIATE_TEST_SUITE_P(Values, QueueGet, ::testing::ValuesIn(kQueueCases),
-                         [](const auto &p) {
-                             std::string s = p.param.szName;
-                             for (char &ch : s) if (!isalnum(static_cast<unsigned char>(ch))) ch = '_';
-                             return s;
-                         });
+INSTANTIATE_TEST_SUITE_P(Values, QueueGet, ::testing::ValuesIn(kQueueCases), CaseName());
 
 TEST(QueueGetFailures, UnreadableStatusFailsWithTheLookupsLine) {
     char szBuf[64];
