@@ -35,14 +35,8 @@ constexpr char kDeviceId[] = "MFG:ACME;MDL:Model 100 Pro;CMD:ESCPL2;";
 // A printer on devName that answers the device ID request.
 void Plug(const std::string &devName, const std::string &busId, const std::string &serial = "SN0001",
           const std::string &deviceId = kDeviceId) {
-    UsbDevice device;
-    device.devName = devName;
-    device.busId = busId;
-    device.serial = serial;
-    PlugUsbDevice(device);
-    UsblpConfig config;
-    config.deviceIdReply = UsblpReply(deviceId);
-    SetUsblp(devName, config);
+    PlugUsbDevice({.devName = devName, .busId = busId, .serial = serial});
+    SetUsblp(devName, {.deviceIdReply = UsblpReply(deviceId)});
 }
 
 // Whether someone holds the flock() lock on the file; a descriptor of its
