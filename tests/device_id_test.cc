@@ -6,7 +6,9 @@
 #include <cstring>
 #include <string>
 
+#include "support/cases.h"
 #include "support/logs.h"
+#include "support/sections.h"
 #include "xavoprinter.h"
 
 using ::testing::IsEmpty;
@@ -62,14 +64,7 @@ TEST_P(DeviceIdSearch, AnswersAndFillsTheBuffer) {
     EXPECT_THAT(Logs(), IsEmpty()) << "a key that is not found is not an error";
 }
 
-INSTANTIATE_TEST_SUITE_P(Table, DeviceIdSearch, ::testing::ValuesIn(kSearchCases),
-                         [](const auto &param_info) {
-                             std::string name = param_info.param.szName;
-                             for (char &ch : name) {
-                                 if (!std::isalnum(static_cast<unsigned char>(ch))) ch = '_';
-                             }
-                             return name;
-                         });
+INSTANTIATE_TEST_SUITE_P(Table, DeviceIdSearch, ::testing::ValuesIn(kSearchCases), xavo::test::CaseName());
 
 TEST(DeviceIdSearch, ArgumentsAreCheckedInOrderAndLogged) {
     char szId[] = "MDL:X;";
@@ -117,10 +112,7 @@ TEST(DeviceIdSearch, GetterReportsABadArgumentOncePerKeyTried) {
 constexpr char kConf[] = "/usr/xavo/etc/printer.conf";
 
 void StoreStringId(const char *szPrinterId, const char *szStringId) {
-    ORLICSzHash *hash = ORLICSzHashAlloc(512);
-    ORLICSzHashSetValue(&hash, "usblp string id", szStringId);
-    ASSERT_GT(ORLICFileAddSection(kConf, szPrinterId, hash, "\t%s = %s\n"), 0);
-    ORLICSzHashFree(hash);
+    xavo::test::WriteSection(kConf, szPrinterId, {{"usblp string id", szStringId}});
 }
 
 struct WalkCase {
