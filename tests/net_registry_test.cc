@@ -12,6 +12,7 @@
 
 #include "support/fault_sweep.h"
 #include "support/logs.h"
+#include "support/records.h"
 #include "support/sections.h"
 #include "xavoprinter.h"
 
@@ -26,19 +27,6 @@ constexpr char kConf[] = "/usr/xavo/etc/printer.conf";
 constexpr char kNptab[] = "/usr/xavo/etc/nptab";
 constexpr char kSmbConf[] = "/etc/samba/smb.reserved.conf";
 constexpr char kPrinter[] = "10.0.0.5-office";
-
-NetPrinterConf Record(const char *szIP = "10.0.0.5", const char *szName = "office", const char *szBackend = "",
-                      const char *szQName = "") {
-    NetPrinterConf conf;
-    std::memset(&conf, 0, sizeof conf);
-    std::memset(conf.abReserved, 'Z', sizeof conf.abReserved);  // never read
-    std::strcpy(conf.szIP, szIP);
-    std::strcpy(conf.szCupsPrinterName, szName);
-    std::strcpy(conf.szBackend, szBackend);
-    std::strcpy(conf.szQName, szQName);
-    std::snprintf(conf.szPrinterId, sizeof conf.szPrinterId, "%s-%s", szIP, szName);
-    return conf;
-}
 
 std::vector<std::string> Items(ORLICSzList *list) {
     std::vector<std::string> out;
@@ -58,11 +46,11 @@ TEST(NetPrinterSection, QNameFollowsTheBackend) {
     for (const auto &c : cases) {
         for (bool bStored : {true, false}) {
             ResetSandbox();
-            NetPrinterConf stored = Record("10.0.0.5", "office", "ipp", "old");
+            NetPrinterConf stored = NetRecord("10.0.0.5", "office", "ipp", "old");
             if (bStored) {
                 ASSERT_EQ(XAVOPrinterNetConfSetup(&stored, 0), 0);
             }
-            NetPrinterConf conf = Record("10.0.0.5", "office", c.szBackend, c.szQName);
+            NetPrinterConf conf = NetRecord("10.0.0.5", "office", c.szBackend, c.szQName);
             ASSERT_EQ(XAVOPrinterNetConfSetup(&conf, 0), 0);
             const Section s = ReadSection(kConf, kPrinter);
             const char *szExpected = bStored ? c.szOverStored : c.szNew;
@@ -81,14 +69,14 @@ TEST(NetPrinterSection, EmptyFieldsKeepStoredValuesUnlessWriteEmptyClearsTheDriv
     for (int blWriteEmpty : {0, 1}) {
         ResetSandbox();
         WriteSection(kConf, kPrinter, stored);
-        NetPrinterConf conf = Record("", "");
+        NetPrinterConf conf = NetRecord("", "");
         std::strcpy(conf.szPrinterId, kPrinter);
         ASSERT_EQ(XAVOPrinterNetConfSetup(&conf, blWriteEmpty), 0);
         Section expected = stored;
         if (blWriteEmpty) expected["driver"] = expected["driver brand"] = "";
         EXPECT_EQ(ReadSection(kConf, kPrinter), expected) << "blWriteEmpty " << blWriteEmpty;
     }
-    NetPrinterConf fresh = Record("10.0.0.9", "new", "socket");
+    NetPrinterConf fresh = NetRecord("10.0.0.9", "new", "socket");
     std::memcpy(fresh.szFitToPage, "yesyesye", 8);  // unterminated: read no further than the field
     ASSERT_EQ(XAVOPrinterNetConfSetup(&fresh, 0), 0);
     EXPECT_EQ(ReadSection(kConf, "10.0.0.9-new"), (Section{{"IP", "10.0.0.9"}, {"cups printer name", "new"},
@@ -99,8 +87,8 @@ TEST(NetPrinterSection, EmptyFieldsKeepStoredValuesUnlessWriteEmptyClearsTheDriv
 }
 
 TEST(NetPrinterTable, AddReplacesByAddressAndRemovalNeedsAddressAndName) {
-    NetPrinterConf office = Record("10.0.0.5", "office"), lab = Record("10.0.0.6", "lab");
-    NetPrinterConf front = Record("10.0.0.5", "front"), elsewhere = Record("10.0.0.50", "front");
+    NetPrinterConf office = NetRecord("10.0.0.5", "office"), lab = NetRecord("10.0.0.6", "lab");
+    NetPrinterConf front = NetRecord("10.0.0.5", "front"), elsewhere = NetRecord("10.0.0.50", "front");
     EXPECT_EQ(XAVOPrinterNetUpdateConf(0, &office), 0);  // no table: nothing to do, no share
     EXPECT_FALSE(FileExists(kSmbConf));
     for (NetPrinterConf *p : {&office, &lab, &front}) ASSERT_EQ(XAVOPrinterNetUpdateConf(1, p), 0);
@@ -114,7 +102,7 @@ TEST(NetPrinterTable, AddReplacesByAddressAndRemovalNeedsAddressAndName) {
     // Texts that would break the table's line are refused.
     for (auto [ip, name] : {std::pair{"10.0.0.7", "a\"b"}, std::pair{"10.0.0.7", "a\n1.2.3.4=\"x"},
                             std::pair{"10.0=0.7", "x"}, std::pair{"", "x"}}) {
-        NetPrinterConf bad = Record(ip, name);
+        NetPrinterConf bad = NetRecord(ip, name);
         EXPECT_EQ(XAVOPrinterNetUpdateConf(1, &bad), -1) << name;
         EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
     }
@@ -182,7 +170,7 @@ TEST(NetPrinterListing, ListingsDuringAddsSeeWholeLinesOnly) {
             for (int i = 0; i < kAdds; ++i) {
                 if (p == 0) {
                     std::string ip = "10.0.0." + std::to_string(i);
-                    NetPrinterConf conf = Record(ip.c_str(), ("queue-" + std::to_string(i)).c_str());
+                    NetPrinterConf conf = NetRecord(ip.c_str(), ("queue-" + std::to_string(i)).c_str());
                     bad |= XAVOPrinterNetUpdateConf(1, &conf) != 0;
                     continue;
                 }
@@ -208,7 +196,7 @@ TEST(NetPrinterListing, ListingsDuringAddsSeeWholeLinesOnly) {
 }
 
 TEST(SmbPrinterShare, ExistingSectionIsNeverRewrittenAndActiveNeedsEightEntries) {
-    NetPrinterConf office = Record();
+    NetPrinterConf office = NetRecord();
     EXPECT_EQ(XAVOPrinterIsActive(), 0);  // no file, nothing logged
     PlaceFile(kSmbConf, "[printers]\n");  // empty: set up already, stays empty
     ASSERT_EQ(XAVOPrinterNetUpdateConf(1, &office), 0);
@@ -228,7 +216,7 @@ TEST(SmbPrinterShare, ExistingSectionIsNeverRewrittenAndActiveNeedsEightEntries)
 
 TEST(NetPrinterPlatformFailures, AddAndRemoveFailCleanly) {
     const std::string updateFailed = "3 printer_net_update_conf:N /usr/xavo/etc/nptab update entry 10.0.0.5=office failed.";
-    NetPrinterConf office = Record();
+    NetPrinterConf office = NetRecord();
     // Removal: each failure is the call's, with the update-failed line.
     SweepFailures([] { PlaceFile(kNptab, "10.0.0.6=\"lab\"\n10.0.0.5=\"office\"\n"); },
                   [&] { return XAVOPrinterNetUpdateConf(0, &office); },
