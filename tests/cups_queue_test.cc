@@ -10,6 +10,7 @@
 
 #include "sandbox/cupsd.h"
 #include "support/logs.h"
+#include "support/records.h"
 #include "sandbox/socket_listener.h"
 #include "xavoprinter.h"
 
@@ -22,6 +23,7 @@ using ::testing::StartsWith;
 using xavo::test::Cupsd;
 using xavo::test::FileExists;
 using xavo::test::Logs;
+using xavo::test::NetRecord;
 using xavo::test::Queue;
 using xavo::test::ReadFile;
 using xavo::test::Tool;
@@ -52,17 +54,6 @@ void Lpadmin(const std::string &queue, const std::string &uri) {
     int status = -1;
     Tool({"/usr/sbin/lpadmin", "-p", queue, "-E", "-v", uri}, &status);
     ASSERT_EQ(status, 0) << queue;
-}
-
-NetPrinterConf NetRecord(const char *szName, const char *szIp, const char *szBackend, const char *szQName) {
-    NetPrinterConf conf;
-    std::memset(&conf, 0, sizeof conf);
-    std::strcpy(conf.szCupsPrinterName, szName);
-    std::strcpy(conf.szIP, szIp);
-    std::strcpy(conf.szBackend, szBackend);
-    std::strcpy(conf.szQName, szQName);
-    std::snprintf(conf.szPrinterId, sizeof conf.szPrinterId, "%s-%s", szIp, szName);
-    return conf;
 }
 
 }  // namespace
@@ -156,7 +147,7 @@ TEST_F(CupsQueues, GivenPpdIsKeptByPrinterIdAndServesLaterCreations) {
 
 TEST_F(CupsQueues, NetworkQueueIsCreatedEnabledWithItsPpd) {
     xavo::test::PlaceFile("/tmp/model.ppd", kPpdText);
-    NetPrinterConf conf = NetRecord("office", "10.0.0.11", "socket", "");
+    NetPrinterConf conf = NetRecord("10.0.0.11", "office", "socket");
     ASSERT_EQ(XAVOPrinterNetCupsAdd(&conf, "/tmp/model.ppd"), 0);
     xavo::test::QueueInfo q = Queue("office");
     EXPECT_TRUE(q.enabled);
@@ -166,7 +157,7 @@ TEST_F(CupsQueues, NetworkQueueIsCreatedEnabledWithItsPpd) {
     EXPECT_EQ(ReadFile("/etc/cups/ppd/10.0.0.11-office.ppd"), kPpdText);
     EXPECT_THAT(Logs(), ElementsAre("3 printer_net_cups_add:N add cups network printer=office, ok"));
 
-    conf = NetRecord("", "10.0.0.12", "lpd", "raw");
+    conf = NetRecord("10.0.0.12", "", "lpd", "raw");
     EXPECT_EQ(XAVOPrinterNetCupsAdd(&conf, nullptr), -1);
     EXPECT_THAT(Logs(), ElementsAre("3 printer_net_cups_add:N cannot find cups printer name, printer=10.0.0.12-"));
 }
@@ -230,7 +221,7 @@ TEST_F(CupsQueues, RemovalTakesOnlyTheQueuesThatAreThePrinters) {
     EXPECT_TRUE(Queue("usbprinter").exists);
     EXPECT_EQ(XAVOPrinterCupsRmByName("nosuchqueue"), 0);  // lpadmin's refusal is not a failure
 
-    NetPrinterConf conf = NetRecord("office", "10.0.0.11", "socket", "");
+    NetPrinterConf conf = NetRecord("10.0.0.11", "office", "socket");
     ASSERT_EQ(XAVOPrinterNetCupsAdd(&conf, nullptr), 0);
     ORLICFileSetSectionValue(kConf, conf.szPrinterId, "cups printer name", "office");
     EXPECT_EQ(XAVOPrinterNetCupsRm(conf.szPrinterId), 0);
@@ -278,7 +269,7 @@ TEST_F(CupsQueues, CreatedQueueHoldsJobsUntilEnabled) {
     xavo::test::SocketListener printer;
     ASSERT_NE(printer.Port(), 0);
     std::string ip = "127.0.0.1:" + std::to_string(printer.Port());
-    NetPrinterConf conf = NetRecord("loopjet", ip.c_str(), "socket", "");
+    NetPrinterConf conf = NetRecord(ip.c_str(), "loopjet", "socket");
     ASSERT_EQ(XAVOPrinterNetCupsAdd(&conf, nullptr), 0);
     ASSERT_EQ(XAVOPrinterCupsPrinterEnable("loopjet", 0), 0);
     const std::string job = "%!PS-not-really\nline one\nline two \x01\x02\xff\n";
