@@ -14,7 +14,9 @@
 
 #include "appliance/standin_control.h"
 #include "sandbox/cupsd.h"
+#include "support/cases.h"
 #include "support/logs.h"
+#include "support/records.h"
 #include "xavoprinter.h"
 
 using ::testing::ElementsAre;
@@ -38,11 +40,7 @@ std::string Recorder(int iExit) {
 }
 
 std::vector<std::string> Runs() {
-    std::vector<std::string> out;
-    std::string text = ReadFile(kRecord);
-    for (size_t at = 0, nl; (nl = text.find('\n', at)) != std::string::npos; at = nl + 1) {
-        out.push_back(text.substr(at, nl - at));
-    }
+    std::vector<std::string> out = xavo::test::Lines(ReadFile(kRecord));
     unlink(kRecord);
     return out;
 }
@@ -53,15 +51,6 @@ std::vector<std::string> LinesWith(const std::string &needle) {
         if (line.find(needle) != std::string::npos) out.push_back(line);
     }
     return out;
-}
-
-NetPrinterConf NetRecord() {
-    NetPrinterConf conf{};
-    std::strcpy(conf.szCupsPrinterName, "office");
-    std::strcpy(conf.szIP, "10.0.0.11");
-    std::strcpy(conf.szBackend, "socket");
-    std::strcpy(conf.szPrinterId, "10.0.0.11-office");
-    return conf;
 }
 
 void OnSignal(int) {}
@@ -89,7 +78,7 @@ protected:
 TEST_F(CupsFaults, LpadminIsTriedThreeTimesTwoSecondsApart) {
     PlaceProgram("/usr/bin/lpadmin", Recorder(3));
     EXPECT_EQ(XAVOPrinterCupsAdd(kA, nullptr), -1);
-    NetPrinterConf conf = NetRecord();
+    NetPrinterConf conf = xavo::test::NetRecord("10.0.0.11", "office", "socket");
     EXPECT_EQ(XAVOPrinterNetCupsAdd(&conf, nullptr), -1);
     EXPECT_EQ(Runs().size(), 6u);
     const char *szUnits[] = {"printer_cups_printer_add", "printer_net_cups_add"};
@@ -212,7 +201,7 @@ TEST_F(CupsFaults, StoppedSchedulerIsReportedByChecksAndStartedByCreation) {
 
     XavoStandinFailCall("ORLIServiceStart", 1, ERR_EXEC);
     EXPECT_EQ(XAVOPrinterCupsAdd(kA, nullptr), -1);
-    NetPrinterConf conf = NetRecord();
+    NetPrinterConf conf = xavo::test::NetRecord("10.0.0.11", "office", "socket");
     XavoStandinFailCall("ORLIServiceStart", 1, ERR_EXEC);
     EXPECT_EQ(XAVOPrinterNetCupsAdd(&conf, nullptr), -1);
     std::vector<std::string> logs = Logs();
