@@ -6,6 +6,7 @@
 #include <sys/stat.h>
 
 #include <cstring>
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -79,34 +80,6 @@ TEST_P(PrintFileArgs, LprGetsExactlyTheOptionsAsked) {
 }
 
 INSTANTIATE_TEST_SUITE_P(Options, PrintFileArgs, ::testing::ValuesIn(kLprCases), CaseName());
-
-TEST(PrintFile, PrinterWithoutQueueNameNeverRunsLpr) {
-    PlaceRecorder("/usr/bin/lpr", "lpr");
-    SetCupsName("no-name-printer", "");
-    for (const char *id : {"no-such-printer", "no-name-printer", ""}) {
-        EXPECT_EQ(XAVOPrinterCupsPrintFile(id, "/tmp/doc.pdf", nullptr, 0), -1) << id;
-        EXPECT_THAT(Logs(), ElementsAre(std::string("3 printer_cups_name_get:N get cups printer name failed, printer=") + id,
-                                        std::string("3 printer_cups_print_file:N cannot get cups printer name, printer=") + id));
-    }
-    EXPECT_EQ(Calls("lpr"), 0);
-}
-
-TEST(PrintFile, NullArgumentsFailSilentlyWithBadParameters) {
-    PlaceRecorder("/usr/bin/lpr", "lpr");
-    SetCupsName(kPrinter, kQueue);
-    EXPECT_EQ(XAVOPrinterCupsPrintFile(nullptr, "/tmp/doc.pdf", nullptr, 0), -1);
-    EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
-    ORLICErrSetEx(0, "test", 0);
-    EXPECT_EQ(XAVOPrinterCupsPrintFile(kPrinter, nullptr, nullptr, 0), -1);
-    EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
-    for (const char *id : {static_cast<const char *>(nullptr), ""}) {
-        ORLICErrSetEx(0, "test", 0);
-        EXPECT_EQ(XAVOPrinterCupsPrintTestPage(id), -1);
-        EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
-    }
-    EXPECT_THAT(Logs(), IsEmpty());
-    EXPECT_EQ(Calls("lpr"), 0);
-}
 
 TEST(PrintTestPage, SubmitsTheSharedPageWithoutRemoveOrTitle) {
     SetCupsName(kPrinter, kQueue);
@@ -288,26 +261,50 @@ TEST_F(JobWaitListing, LpqThatCannotBeStartedFailsWithThePlatformsError) {
     EXPECT_EQ(Calls("lpq"), 0);
 }
 
-TEST(JobWait, StoppedSchedulerIsReportedBeforeLpqRuns) {
+// Calls refused before lpr or lpq runs: bad arguments (silently, with
+// ERR_BAD_PARAMETERS), printers without a queue name, and job questions
+// while no scheduler runs.
+TEST(RefusedCalls, FailBeforeAnyToolRuns) {
+    const std::string nameGet = "3 printer_cups_name_get:N get cups printer name failed, printer=";
+    const std::string noName = "3 printer_cups_print_file:N cannot get cups printer name, printer=";
+    struct Case {
+        const char *szName;
+        std::function<int32_t()> call;
+        std::uint32_t code;  // 0: not checked
+        std::vector<std::string> logs;
+    };
+    const Case cases[] = {
+        {"null printer", [] { return XAVOPrinterCupsPrintFile(nullptr, "/tmp/doc.pdf", nullptr, 0); }, ERR_BAD_PARAMETERS, {}},
+        {"null file", [] { return XAVOPrinterCupsPrintFile(kPrinter, nullptr, nullptr, 0); }, ERR_BAD_PARAMETERS, {}},
+        {"null test page printer", [] { return XAVOPrinterCupsPrintTestPage(nullptr); }, ERR_BAD_PARAMETERS, {}},
+        {"empty test page printer", [] { return XAVOPrinterCupsPrintTestPage(""); }, ERR_BAD_PARAMETERS, {}},
+        {"null job printer", [] { return XAVOPrinterCupsJobWaitComplete(nullptr, "5"); }, ERR_BAD_PARAMETERS, {}},
+        {"null job", [] { return XAVOPrinterCupsJobWaitComplete(kPrinter, nullptr); }, ERR_BAD_PARAMETERS, {}},
+        {"unknown printer", [] { return XAVOPrinterCupsPrintFile("no-such-printer", "/tmp/doc.pdf", nullptr, 0); }, 0,
+         {nameGet + "no-such-printer", noName + "no-such-printer"}},
+        {"printer without a queue name", [] { return XAVOPrinterCupsPrintFile("no-name-printer", "/tmp/d", nullptr, 0); },
+         0, {nameGet + "no-name-printer", noName + "no-name-printer"}},
+        {"empty printer ID", [] { return XAVOPrinterCupsPrintFile("", "/tmp/doc.pdf", nullptr, 0); }, 0,
+         {nameGet, noName}},
+        {"job of an unknown printer", [] { return XAVOPrinterCupsJobWaitComplete("other", "5"); }, 0,
+         {nameGet + "other", "3 printer_cups_job_wait_complete:N get cups printer name failed, printer=other"}},
+        {"job while no scheduler runs", [] { return XAVOPrinterCupsJobWaitComplete(kPrinter, "5"); }, 0,
+         {"3 printer_cups_job_wait_complete:N cupsd is not running."}},
+    };
     SetCupsName(kPrinter, kQueue);
+    SetCupsName("no-name-printer", "");
+    PlaceRecorder("/usr/bin/lpr", "lpr");
     PlaceLpq(kListingEmpty);
-    EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(kPrinter, "5"), -1);
-    EXPECT_THAT(Logs(), ElementsAre("3 printer_cups_job_wait_complete:N cupsd is not running."));
-    EXPECT_EQ(Calls("lpq"), 0);
-}
-
-TEST(JobWait, BadArgumentsAndUnknownPrintersFail) {
-    SetCupsName(kPrinter, kQueue);
-    PlaceLpq(kListingEmpty);
-    EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(nullptr, "5"), -1);
-    EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
-    ORLICErrSetEx(0, "test", 0);
-    EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(kPrinter, nullptr), -1);
-    EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
-    EXPECT_THAT(Logs(), IsEmpty());
-    EXPECT_EQ(XAVOPrinterCupsJobWaitComplete("other", "5"), -1);
-    EXPECT_THAT(Logs(), ElementsAre("3 printer_cups_name_get:N get cups printer name failed, printer=other",
-                                    "3 printer_cups_job_wait_complete:N get cups printer name failed, printer=other"));
+    for (const Case &c : cases) {
+        SCOPED_TRACE(c.szName);
+        ORLICErrSetEx(0, "test", 0);
+        EXPECT_EQ(c.call(), -1);
+        if (c.code != 0) {
+            EXPECT_EQ(ORLICErrGet(), c.code);
+        }
+        EXPECT_EQ(Logs(), c.logs);
+    }
+    EXPECT_EQ(Calls("lpr"), 0);
     EXPECT_EQ(Calls("lpq"), 0);
 }
 
@@ -339,26 +336,19 @@ TEST(CleanSpool, RemovesEveryNameWithADotAsAPlainName) {
     EXPECT_THAT(Logs(), IsEmpty());
 }
 
-TEST(CleanSpool, LprmFailureIsOnlyLoggedAndEmptySpoolSucceeds) {
+TEST(CleanSpool, LprmFailureIsOnlyLoggedButRmFailureFails) {
     PlaceRecorder("/usr/bin/lprm", "lprm", 1);
     for (bool bDirExists : {false, true}) {
         if (bDirExists) mkdir(kSpool, 0755);
         EXPECT_EQ(XAVOPrinterCleanSpool(), 0);
-        std::vector<std::string> logs = Logs();
-        ASSERT_EQ(logs.size(), 1u);
-        EXPECT_THAT(logs[0], StartsWith("3 printer_clean_spool:N lprm all failed. [0x"));
+        EXPECT_THAT(Logs(), ElementsAre(StartsWith("3 printer_clean_spool:N lprm all failed. [0x")));
     }
-}
-
-TEST(CleanSpool, RmFailureFailsWithThePlatformsError) {
-    PlaceRecorder("/usr/bin/lprm", "lprm");
     PlaceFile(std::string(kSpool) + "/job.ps", "x");
     PlaceRecorder("/bin/rm", "rm", 1);
     EXPECT_EQ(XAVOPrinterCleanSpool(), -1);
     EXPECT_THAT(RecordedArgs("rm"), ElementsAre("-rf", std::string(kSpool) + "/job.ps"));
-    std::vector<std::string> logs = Logs();
-    ASSERT_EQ(logs.size(), 1u);
-    EXPECT_THAT(logs[0], StartsWith("3 printer_clean_spool:N remove /var/services/printer failed. [0x"));
+    EXPECT_THAT(Logs(), ElementsAre(StartsWith("3 printer_clean_spool:N lprm all failed. [0x"),
+                                    StartsWith("3 printer_clean_spool:N remove /var/services/printer failed. [0x")));
 }
 
 // ---- against the real scheduler -----------------------------------------
