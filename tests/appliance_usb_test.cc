@@ -14,7 +14,6 @@
 
 using xavo::test::PlaceFile;
 using xavo::test::PlugUsbDevice;
-using xavo::test::UsbDevice;
 
 namespace {
 
@@ -57,31 +56,20 @@ TEST(PlatformUsb, BlockTooSmallForAGrownTableFails) {
     EXPECT_EQ(ORLICErrGet(), 0x0100u);
 }
 
+// The IDs, strings and printer ID of a plugged printer are pinned through
+// the USB plug-in tests; here both name forms, the cut, other interface
+// classes, a device without serial number and the failures.
 TEST(PlatformUsb, DeviceInformationComesFromSysfs) {
-    UsbDevice printer;
-    printer.manufacturer = std::string(200, 'M');
-    PlugUsbDevice(printer);
-    UsbDevice other;
-    other.devName = "lp1";
-    other.busId = "1-2";
-    other.serial = "";
-    other.interfaceClass = 3;
-    PlugUsbDevice(other);
-
+    PlugUsbDevice({.manufacturer = std::string(200, 'M')});
+    PlugUsbDevice({.devName = "lp1", .busId = "1-2", .serial = "", .interfaceClass = 3});
+    XAVOUSBDevInfo info;
     for (const char *name : {"lp0", "/dev/usb/lp0"}) {
-        XAVOUSBDevInfo info;
         std::memset(&info, 0, sizeof info);
         ASSERT_EQ(XAVOUSBDevGetInfo(name, &info), 0) << name;
         EXPECT_EQ(info.uKind, 0x04u);
-        EXPECT_EQ(info.uVendorId, 0x04b8u);
-        EXPECT_EQ(info.uProductId, 0x0005u);
         EXPECT_EQ(info.szManufacturer, std::string(127, 'M')) << "cut to fit";
-        EXPECT_STREQ(info.szProduct, "Model 100");
-        EXPECT_STREQ(info.szSerial, "SN0001");
         EXPECT_STREQ(info.szPrinterId, "04b8:0005:SN0001");
     }
-    XAVOUSBDevInfo info;
-    std::memset(&info, 0, sizeof info);
     ASSERT_EQ(XAVOUSBDevGetInfo("lp1", &info), 0);
     EXPECT_EQ(info.uKind & XAVOUSB_KIND_PRINTER_MASK, 0u) << "not a printer interface";
     EXPECT_STREQ(info.szPrinterId, "") << "no serial, no printer ID";
