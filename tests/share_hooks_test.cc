@@ -63,21 +63,6 @@ TEST_P(UsbipLockStatus, AnswersZeroWithTheStatusOrFree) {
 
 INSTANTIATE_TEST_SUITE_P(Files, UsbipLockStatus, ::testing::ValuesIn(kLockCases), CaseName());
 
-TEST(UsbipLockStatusArguments, BadArgumentsFailSilentlyWithBadParameters) {
-    char szBuf[16];
-    struct {
-        const char *id;
-        char *buf;
-        int32_t cb;
-    } cases[] = {{kPrinter, nullptr, 16}, {kPrinter, szBuf, 0}, {kPrinter, szBuf, -1}, {nullptr, szBuf, 16}};
-    for (const auto &c : cases) {
-        ORLICErrSetEx(0, "test", 0);
-        EXPECT_EQ(XAVOPrinterUsbipGetLockStatus(c.id, c.buf, c.cb), -1);
-        EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
-    }
-    EXPECT_THAT(Logs(), IsEmpty());
-}
-
 // ---- driver binding tool -----------------------------------------------
 
 using Hook = int32_t (*)(const char *);
@@ -186,7 +171,10 @@ TEST(QueueGetFailures, UnreadableStatusFailsWithTheLookupsLine) {
     EXPECT_THAT(Logs(), ElementsAre(line, line));
 }
 
-TEST(QueueGetFailures, BadArgumentsLogTheFailedCondition) {
+// Both status readers refuse bad arguments with ERR_BAD_PARAMETERS: the
+// queue text logs the failed condition, the lock status logs nothing (and
+// takes an empty printer ID, which reads the bare prefix).
+TEST(StatusArguments, BadArgumentsFailWithBadParameters) {
     char szBuf[16];
     struct {
         const char *id;
@@ -199,11 +187,17 @@ TEST(QueueGetFailures, BadArgumentsLogTheFailedCondition) {
                  {kPrinter, szBuf, 0, "0 < cbBuf"},
                  {kPrinter, szBuf, -3, "0 < cbBuf"}};
     for (const auto &c : cases) {
+        SCOPED_TRACE(c.szCondition);
         ORLICErrSetEx(0, "test", 0);
         EXPECT_EQ(XAVOPrinterQueueGet(c.id, c.buf, c.cb), -1);
         EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
         EXPECT_THAT(Logs(), ElementsAre(std::string("3 printer_queue_get:N Invaild Argument (") + c.szCondition +
                                         ")=[0]\n"));
+        if (c.id != nullptr && c.id[0] == '\0') continue;
+        ORLICErrSetEx(0, "test", 0);
+        EXPECT_EQ(XAVOPrinterUsbipGetLockStatus(c.id, c.buf, c.cb), -1);
+        EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
+        EXPECT_THAT(Logs(), IsEmpty());
     }
 }
 
