@@ -173,22 +173,16 @@ TEST(PrinterConfUnlock, NegativeDescriptorIsABadArgumentAndAClosedOneAnswersZero
     EXPECT_THAT(Logs(), IsEmpty());
 }
 
-TEST(PrinterCupsNameGet, FindsTheStoredName) {
+// A missing section and an empty name are pinned through the print
+// submission's refusals, with this line.
+TEST(PrinterCupsNameGet, FindsTheStoredNameOrLogsThePrinter) {
     WriteSection(kPrinter, kStored);
+    WriteSection("no-name", {{"producer", "ACME"}});
     char szName[32] = "junk";
     EXPECT_EQ(XAVOPrinterCupsNameGet(kPrinter, szName, sizeof szName), 0);
     EXPECT_STREQ(szName, "usbprinter1");
-}
-
-TEST(PrinterCupsNameGet, MissingOrEmptyNameLogsThePrinter) {
-    WriteSection(kPrinter, {{"producer", "ACME"}});
-    WriteSection("empty-name", {{"cups printer name", ""}});
-    char szName[32];
-    for (const char *id : {kPrinter, "empty-name", "no-such-printer"}) {
-        EXPECT_EQ(XAVOPrinterCupsNameGet(id, szName, sizeof szName), -1) << id;
-        EXPECT_THAT(Logs(), ElementsAre("3 printer_cups_name_get:N get cups printer name failed, printer=" +
-                                        std::string(id)));
-    }
+    EXPECT_EQ(XAVOPrinterCupsNameGet("no-name", szName, sizeof szName), -1);
+    EXPECT_THAT(Logs(), ElementsAre("3 printer_cups_name_get:N get cups printer name failed, printer=no-name"));
 }
 
 TEST(PrinterCupsNameGet, BadArgumentsFailSilentlyWithBadParameters) {
