@@ -46,7 +46,13 @@ XAVO_EXPORT int32_t XAVOPrinterGoogleInfoSet(const PrinterGoogleInfo *pInfo) noe
             XSETERR(ERR_OUT_OF_MEMORY);
             return -1;
         }
-        // Keys of the section this library does not know are kept.
+        // Keys of the section this library does not know are kept.  The
+        // read is outside the printer lock, which is held around the write
+        // only: the write replaces just this section in a fresh read of the
+        // file, so writers of other printers' sections lose nothing; only
+        // two account changes at once could drop each other's unknown keys,
+        // and the web administration, the one writer of the account, makes
+        // them one at a time.
         ORLICFileGetSection(xavo::kPrinterConfPath, xavo::kGoogleSection, hash.addr());
 
         const std::string account(xavo::FieldText(pInfo->szAccount));
