@@ -13,17 +13,8 @@
 set -euo pipefail
 cd "$(dirname "$0")/.."
 
-if [ "$(id -u)" -ne 0 ]; then
-  echo "scripts/demo.sh must run as root (the sandbox uses namespaces)" >&2
-  exit 2
-fi
-# The sandbox mounts a fresh /tmp and /run: a checkout there would vanish
-# from under the demo.
-case "$PWD/" in
-  /tmp/*|/run/*)
-    echo "scripts/demo.sh: run it from a checkout outside /tmp and /run (the sandbox replaces them)" >&2
-    exit 2 ;;
-esac
+. scripts/checks.sh
+require_sandbox_host scripts/demo.sh
 
 bash scripts/install-deps.sh
 cmake -S . -B build/demo -G Ninja -DCMAKE_BUILD_TYPE=Release -DXAVO_BUILD_TESTS=OFF >/dev/null

@@ -7,18 +7,8 @@
 set -euo pipefail
 cd "$(dirname "$0")/.."
 
-if [ "$(id -u)" -ne 0 ]; then
-  echo "scripts/test.sh must run as root (the test sandbox uses namespaces)" >&2
-  exit 2
-fi
-
-# The sandbox gives every suite a fresh, empty /tmp and /run: a checkout
-# there would vanish from under its own tests.
-case "$PWD/" in
-  /tmp/*|/run/*)
-    echo "scripts/test.sh: run it from a checkout outside /tmp and /run (the test sandbox replaces them)" >&2
-    exit 2 ;;
-esac
+. scripts/checks.sh
+require_sandbox_host scripts/test.sh
 
 bash scripts/install-deps.sh
 
