@@ -1,5 +1,6 @@
 // Printing and jobs: lpr's argument vector, reading lpq listings, cleaning
-// the spool, and the same operations against a real CUPS scheduler.
+// the spool, and job questions and cleaning against a real CUPS scheduler
+// (the demo walk-through delivers a test page and a file end to end).
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -12,7 +13,6 @@
 
 #include "appliance/standin_control.h"
 #include "sandbox/cupsd.h"
-#include "sandbox/socket_listener.h"
 #include "support/cases.h"
 #include "support/fault_sweep.h"
 #include "support/logs.h"
@@ -65,7 +65,6 @@ const LprCase kLprCases[] = {
     {"remove only", nullptr, 1, {"-P", kQueue, "-r", "/tmp/doc.pdf"}},
     {"title only", "t;$(id)", 0, {"-P", kQueue, "-T", "t;$(id)", "/tmp/doc.pdf"}},
     {"remove flag 2 keeps the file", "", 2, {"-P", kQueue, "/tmp/doc.pdf"}},
-    {"empty title is no title", "", 1, {"-P", kQueue, "-r", "/tmp/doc.pdf"}},
 };
 
 class PrintFileArgs : public ::testing::TestWithParam<LprCase> {};
@@ -282,8 +281,6 @@ TEST(RefusedCalls, FailBeforeAnyToolRuns) {
         {"null job", [] { return XAVOPrinterCupsJobWaitComplete(kPrinter, nullptr); }, ERR_BAD_PARAMETERS, {}},
         {"unknown printer", [] { return XAVOPrinterCupsPrintFile("no-such-printer", "/tmp/doc.pdf", nullptr, 0); }, 0,
          {nameGet + "no-such-printer", noName + "no-such-printer"}},
-        {"printer without a queue name", [] { return XAVOPrinterCupsPrintFile("no-name-printer", "/tmp/d", nullptr, 0); },
-         0, {nameGet + "no-name-printer", noName + "no-name-printer"}},
         {"empty printer ID", [] { return XAVOPrinterCupsPrintFile("", "/tmp/doc.pdf", nullptr, 0); }, 0,
          {nameGet, noName}},
         {"job of an unknown printer", [] { return XAVOPrinterCupsJobWaitComplete("other", "5"); }, 0,
@@ -292,7 +289,6 @@ TEST(RefusedCalls, FailBeforeAnyToolRuns) {
          {"3 printer_cups_job_wait_complete:N cupsd is not running."}},
     };
     SetCupsName(kPrinter, kQueue);
-    SetCupsName("no-name-printer", "");
     PlaceRecorder("/usr/bin/lpr", "lpr");
     PlaceLpq(kListingEmpty);
     for (const Case &c : cases) {
@@ -360,7 +356,6 @@ protected:
     void SetUp() override {
         xavo::test::Cupsd::Start();
         xavo::test::Cupsd::RemoveAllQueues();
-        if (!FileExists(kTestPage)) PlaceFile(kTestPage, "%!PS-Adobe-3.0\n%%Title: test page\nshowpage\n");
     }
     static void TearDownTestSuite() {
         // The scheduler is our child: reaped here by its id once stopped.
@@ -369,15 +364,6 @@ protected:
         if (pid > 0) waitpid(pid, nullptr, 0);
     }
 
-    // A raw network queue printing to the listener.
-    static std::string NetQueue(const xavo::test::SocketListener &printer) {
-        const std::string name = "netprinter";
-        xavo::test::Tool({"/usr/sbin/lpadmin", "-p", name, "-v",
-                          "socket://127.0.0.1:" + std::to_string(printer.Port()), "-E"});
-        const std::string id = "127.0.0.1-" + name;
-        SetCupsName(id, name);
-        return id;
-    }
     // A USB-style queue that holds its jobs: disabled, nothing behind it.
     static std::string StalledQueue() {
         const std::string name = "stalled";
@@ -388,27 +374,6 @@ protected:
     }
     static std::string Listing(const std::string &queue) { return xavo::test::Tool({"/usr/bin/lpq", "-P", queue}); }
 };
-
-TEST_F(RealCups, FileReachesTheNetworkPrinterUnchanged) {
-    xavo::test::SocketListener printer;
-    ASSERT_NE(printer.Port(), 0);
-    const std::string id = NetQueue(printer);
-    std::string data = "\x1b%-12345X@PJL\r\n";
-    for (int i = 0; i < 256; ++i) data += static_cast<char>(i);
-    PlaceFile("/tmp/job.bin", data);
-    ASSERT_EQ(XAVOPrinterCupsPrintFile(id.c_str(), "/tmp/job.bin", "bytes", 0), 0);
-    EXPECT_EQ(printer.WaitForBytes(data.size(), 30000), data);
-    EXPECT_TRUE(FileExists("/tmp/job.bin"));
-}
-
-TEST_F(RealCups, TestPageReachesThePrinterAndStays) {
-    xavo::test::SocketListener printer;
-    const std::string id = NetQueue(printer);
-    const std::string page = ReadFile(kTestPage);
-    ASSERT_EQ(XAVOPrinterCupsPrintTestPage(id.c_str()), 0);
-    EXPECT_EQ(printer.WaitForBytes(page.size(), 30000), page);
-    EXPECT_TRUE(FileExists(kTestPage));
-}
 
 TEST_F(RealCups, HeldJobIsListedUntilCancelledAndCarriesItsTitle) {
     const std::string id = StalledQueue();
@@ -423,7 +388,6 @@ TEST_F(RealCups, HeldJobIsListedUntilCancelledAndCarriesItsTitle) {
     ASSERT_THAT(jobs, StartsWith("stalled-"));
     const std::string job = jobs.substr(8, jobs.find(' ') - 8);
     EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(id.c_str(), job.c_str()), 1) << listing;
-    EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(id.c_str(), job.c_str()), 1);
 
     xavo::test::Tool({"/usr/bin/lprm", "-P", "stalled", job});
     EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(id.c_str(), job.c_str()), 0) << Listing("stalled");
