@@ -289,6 +289,23 @@ TEST(HostileOutput, LongLinesNulBytesAndFloodsStayInsideTheBuffers) {
     Logs();
 }
 
+// The real daemon's print order cannot be chosen: here the preferred
+// service comes first, so that keeping the last service seen would fail.
+TEST(AvahiPreference, FirstPrintedPreferredServiceIsNotReplacedByALaterLesserOne) {
+    PlaceProgram(kAvahiDaemon, kAvahiDaemonStub);
+    PlaceProgram("/usr/xavo/sbin/avahi-browse",
+                 "#!/bin/sh\n"
+                 "echo '=;lo;IPv4;P;_canon-bjnp1._tcp;local;h;10.0.0.1;8611;\"usb_MFG=A\" \"usb_MDL=B\"'\n"
+                 "echo '=;lo;IPv4;P;_pdl-datastream._tcp;local;h;10.0.0.1;9100;\"usb_MDL=S\"'\n"
+                 "echo '=;lo;IPv4;P;_printer._tcp;local;h;10.0.0.1;515;\"usb_MDL=L\"'\n"
+                 "echo '=;lo;IPv4;P;_ipp._tcp;local;h;10.0.0.1;631;\"usb_MDL=I\"'\n");
+    NetPrinterInfo info{};
+    EXPECT_EQ(XAVOPrinterNetAvahiInfoGet("10.0.0.1", &info), 0);
+    EXPECT_STREQ(info.szBackend, "bjnp");
+    EXPECT_STREQ(info.szModel, "B");
+    Logs();
+}
+
 // ---- mDNS against the real avahi-daemon ----
 // Three printers on loopback.  127.0.0.11 begins with 127.0.0.1 and
 // announces the most preferred service: asking for 127.0.0.1 must not
