@@ -394,5 +394,14 @@ int main(int argc, char **argv) {
     // Whatever else was started inside (a job's backend, a shell's
     // children) is stopped by its id before the sandbox goes.
     xavo::test::detail::StopLeftovers();
+    const std::vector<xavo::test::SandboxProcess> left = xavo::test::Descendants();
+    if (left.empty()) {
+        Say("Stopped cupsd, snmpd and the printers; the sandbox's files go with its namespaces.");
+    } else {
+        for (const xavo::test::SandboxProcess &p : left) {
+            std::fprintf(stderr, "xavoprinter-demo: still running: %d %s\n", static_cast<int>(p.pid), p.comm.c_str());
+        }
+        status = 1;
+    }
     return status;
 }
