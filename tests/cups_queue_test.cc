@@ -11,7 +11,6 @@
 #include "sandbox/cupsd.h"
 #include "support/logs.h"
 #include "support/records.h"
-#include "sandbox/socket_listener.h"
 #include "xavoprinter.h"
 
 using ::testing::Contains;
@@ -252,26 +251,4 @@ TEST_F(CupsQueues, SchedulerFileLosesExactlyTheUsbBlocksWhileStopped) {
     // block edges are pinned against crafted files in the fault tests).
     Cupsd::Start();
     EXPECT_EQ(Tool({"/usr/bin/lpstat", "-v"}), "device for usbprinter12: socket://10.0.0.12/\n");
-}
-
-// A queue the library made holds a job while disabled and prints it once
-// enabled, to a socket printer on loopback.
-TEST_F(CupsQueues, CreatedQueueHoldsJobsUntilEnabled) {
-    xavo::test::SocketListener printer;
-    ASSERT_NE(printer.Port(), 0);
-    std::string ip = "127.0.0.1:" + std::to_string(printer.Port());
-    NetPrinterConf conf = NetRecord(ip.c_str(), "loopjet", "socket");
-    ASSERT_EQ(XAVOPrinterNetCupsAdd(&conf, nullptr), 0);
-    ASSERT_EQ(XAVOPrinterCupsPrinterEnable("loopjet", 0), 0);
-    const std::string job = "%!PS-not-really\nline one\nline two \x01\x02\xff\n";
-    xavo::test::PlaceFile("/tmp/job.txt", job);
-    int status = -1;
-    Tool({"/usr/bin/lpr", "-P", "loopjet", "-o", "raw", "/tmp/job.txt"}, &status);
-    ASSERT_EQ(status, 0);
-    EXPECT_THAT(Tool({"/usr/bin/lpstat", "-o", "loopjet"}), StartsWith("loopjet-"));
-    EXPECT_EQ(printer.WaitForBytes(1, 300), "");
-
-    ASSERT_EQ(XAVOPrinterCupsPrinterEnable("loopjet", 1), 0);
-    EXPECT_EQ(printer.WaitForBytes(job.size(), 20000), job);
-    EXPECT_EQ(printer.Connections(), 1);
 }
