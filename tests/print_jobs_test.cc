@@ -1,6 +1,6 @@
 // Printing and jobs: lpr's argument vector, reading lpq listings, cleaning
-// the spool, and job questions and cleaning against a real CUPS scheduler
-// (the demo walk-through delivers a test page and a file end to end).
+// the spool, and a held job against a real CUPS scheduler (the demo
+// walk-through delivers a test page and a file end to end).
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -391,15 +391,6 @@ TEST_F(RealCups, HeldJobIsListedUntilCancelledAndCarriesItsTitle) {
 
     xavo::test::Tool({"/usr/bin/lprm", "-P", "stalled", job});
     EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(id.c_str(), job.c_str()), 0) << Listing("stalled");
-}
-
-TEST_F(RealCups, CleanSpoolEmptiesTheSpoolWhateverLprmSays) {
-    PlaceFile(std::string(kSpool) + "/smbprn.00000001.x", "spooled");
-    PlaceFile(std::string(kSpool) + "/keep", "not matched");
-    EXPECT_EQ(XAVOPrinterCleanSpool(), 0);
-    EXPECT_FALSE(FileExists(std::string(kSpool) + "/smbprn.00000001.x"));
-    EXPECT_TRUE(FileExists(std::string(kSpool) + "/keep"));
-    Logs();
 }
 
 }  // namespace
