@@ -333,7 +333,11 @@ void EnterSandbox() {
     Must(unshare(CLONE_NEWNS | CLONE_NEWNET) == 0, "unshare (the tests need root)");
     // Nothing mounted from here on propagates back to the host, and nothing
     // the host mounts later shows up here.
-    MountOrDie(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr);
+    // In a chroot whose directory is no mount point this fails with EINVAL;
+    // binding it onto itself here would propagate the bind to the host
+    // before anything is private, so the caller must do it beforehand.
+    Must(mount(nullptr, "/", nullptr, MS_REC | MS_PRIVATE, nullptr) == 0,
+         "make / private (in a chroot, bind-mount its directory onto itself first)");
     BringLoopbackUp();
     TuneNetworkNamespace();
     BuildDev();
