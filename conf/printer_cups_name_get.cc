@@ -20,6 +20,7 @@ XAVO_EXPORT int32_t XAVOPrinterCupsNameGet(const char *szPrinterId, char *szBuf,
         // so a read sees the file before or after a write, never half of it.
         int32_t iRead = ORLICFileGetSectionValue(xavo::kPrinterConfPath, szPrinterId,
                                                  xavo::kKeyCupsPrinterName, szBuf, cbBuf);
+        // Callers rely on it: 0 always comes with a name, never an empty one.
         if (iRead >= 0 && szBuf[0] != '\0') return 0;
         XLOG(LOG_ERR, kLogNameGetFailed, szPrinterId);
         return -1;

@@ -28,7 +28,7 @@ constexpr int kDeviceUriSize = 4096;
 // The stored name when CUPS does not hold it for another device, else a
 // free "usbprinter%d"; false when both are taken.
 bool ChooseName(const char *szPrinterId, char (&szName)[kNameSize]) {
-    if (XAVOPrinterCupsNameGet(szPrinterId, szName, sizeof szName) == 0 && szName[0] != '\0') {
+    if (XAVOPrinterCupsNameGet(szPrinterId, szName, sizeof szName) == 0) {
         int32_t iCheck = XAVOPrinterCupsNameCheck(szPrinterId, szName);
         if (iCheck == 0 || iCheck == 1) return true;
     }

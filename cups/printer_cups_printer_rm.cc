@@ -17,7 +17,7 @@ XAVO_EXPORT int32_t XAVOPrinterCupsRm(const char *szPrinterId) noexcept {
             return -1;
         }
         char szName[kNameSize] = {};
-        if (XAVOPrinterCupsNameGet(szPrinterId, szName, sizeof szName) < 0 || szName[0] == '\0') {
+        if (XAVOPrinterCupsNameGet(szPrinterId, szName, sizeof szName) != 0) {
             XLOG(LOG_ERR, kLogNoName, szPrinterId);
             return -1;
         }

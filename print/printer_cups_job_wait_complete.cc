@@ -4,7 +4,6 @@
 
 #include <cerrno>
 #include <cstdio>
-#include <cstring>
 #include <string>
 
 #include "internal/boundary.h"
@@ -72,9 +71,8 @@ XAVO_EXPORT int32_t XAVOPrinterCupsJobWaitComplete(const char *szPrinterId, cons
             XSETERR(ERR_BAD_PARAMETERS);
             return -1;
         }
-        char szCupsName[kCupsNameSize];
-        std::memset(szCupsName, 0, sizeof szCupsName);
-        if (XAVOPrinterCupsNameGet(szPrinterId, szCupsName, kCupsNameSize) < 0 || szCupsName[0] == '\0') {
+        char szCupsName[kCupsNameSize] = {};
+        if (XAVOPrinterCupsNameGet(szPrinterId, szCupsName, kCupsNameSize) != 0) {
             XLOG(LOG_ERR, kLogNoCupsName, szPrinterId);
             return -1;
         }

@@ -1,7 +1,6 @@
 // Submits a file to a printer's CUPS queue with lpr.
 #include <syslog.h>
 
-#include <cstring>
 
 #include "internal/argv.h"
 #include "internal/boundary.h"
@@ -40,9 +39,8 @@ XAVO_EXPORT int32_t XAVOPrinterCupsPrintFile(const char *szPrinterId, const char
             XSETERR(ERR_BAD_PARAMETERS);
             return -1;
         }
-        char szCupsName[kCupsNameSize];
-        std::memset(szCupsName, 0, sizeof szCupsName);
-        if (XAVOPrinterCupsNameGet(szPrinterId, szCupsName, kCupsNameSize) < 0 || szCupsName[0] == '\0') {
+        char szCupsName[kCupsNameSize] = {};
+        if (XAVOPrinterCupsNameGet(szPrinterId, szCupsName, kCupsNameSize) != 0) {
             XLOG(LOG_ERR, kLogNoCupsName, szPrinterId);
             return -1;
         }
