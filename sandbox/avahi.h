@@ -31,21 +31,17 @@
 #include <fcntl.h>
 #include <net/if.h>
 #include <poll.h>
-#include <signal.h>
-#include <spawn.h>
 #include <sys/ioctl.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <cstring>
 #include <string>
 #include <vector>
 
+#include "sandbox/daemon.h"
 #include "sandbox/sandbox.h"
-
-extern char **environ;
 
 namespace xavo::test {
 
@@ -77,13 +73,13 @@ public:
         symlink("/usr/bin/avahi-browse", kBrowsePath);
 
         std::string busConf = std::string(kDir) + "/bus.conf";
-        bus_ = Spawn({"/usr/bin/dbus-daemon", "--nofork", "--nopidfile", "--config-file=" + busConf},
+        bus_ = StartDaemon({"/usr/bin/dbus-daemon", "--nofork", "--nopidfile", "--config-file=" + busConf},
                      std::string(kDir) + "/bus.log");
         for (int i = 0; i < 250 && bus_ > 0 && !FileExists(kBusSocket); ++i) poll(nullptr, 0, 20);
         if (!FileExists(kBusSocket)) return;
 
         std::string log = std::string(kDir) + "/daemon.log";
-        daemon_ = Spawn({"/usr/sbin/avahi-daemon", "-f", std::string(kDir) + "/avahi-daemon.conf", "--no-drop-root",
+        daemon_ = StartDaemon({"/usr/sbin/avahi-daemon", "-f", std::string(kDir) + "/avahi-daemon.conf", "--no-drop-root",
                          "--no-chroot", "--no-rlimits"},
                         log);
         // One line for each static host name and one for each service group.
@@ -96,8 +92,8 @@ public:
     AvahiResponder(const AvahiResponder &) = delete;
     AvahiResponder &operator=(const AvahiResponder &) = delete;
     ~AvahiResponder() {
-        Stop(daemon_);
-        Stop(bus_);
+        StopDaemon(daemon_);
+        StopDaemon(bus_);
     }
 
     bool ready() const { return ready_ && Running(daemon_) && Running(bus_); }
@@ -179,39 +175,12 @@ private:
         close(fd);
     }
 
-    static pid_t Spawn(const std::vector<std::string> &argv, const std::string &logPath) {
-        posix_spawn_file_actions_t actions;
-        posix_spawn_file_actions_init(&actions);
-        posix_spawn_file_actions_addopen(&actions, 0, "/dev/null", O_RDONLY, 0);
-        posix_spawn_file_actions_addopen(&actions, 1, logPath.c_str(), O_WRONLY | O_CREAT | O_APPEND, 0644);
-        posix_spawn_file_actions_adddup2(&actions, 1, 2);
-        std::vector<char *> args;
-        for (const std::string &a : argv) args.push_back(const_cast<char *>(a.c_str()));
-        args.push_back(nullptr);
-        pid_t pid = -1;
-        if (posix_spawn(&pid, args[0], &actions, nullptr, args.data(), environ) != 0) pid = -1;
-        posix_spawn_file_actions_destroy(&actions);
-        return pid;
-    }
-
     // Our child, not yet exited (a zombie counts as gone).
     static bool Running(pid_t pid) {
         if (pid <= 0) return false;
         std::string stat = ReadFile("/proc/" + std::to_string(pid) + "/stat");
         std::string::size_type close = stat.rfind(')');
         return close != std::string::npos && close + 2 < stat.size() && stat[close + 2] != 'Z';
-    }
-
-    // SIGTERM, up to 2 seconds to go, then SIGKILL; reaped either way.
-    static void Stop(pid_t pid) {
-        if (pid <= 0) return;
-        kill(pid, SIGTERM);
-        for (int i = 0; i < 200; ++i) {
-            if (waitpid(pid, nullptr, WNOHANG) == pid) return;
-            poll(nullptr, 0, 10);
-        }
-        kill(pid, SIGKILL);
-        waitpid(pid, nullptr, 0);
     }
 
     static size_t Count(const std::string &text, const char *szWhat) {

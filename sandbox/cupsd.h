@@ -48,6 +48,7 @@
 #include <string>
 #include <vector>
 
+#include "sandbox/daemon.h"
 #include "sandbox/sandbox.h"
 
 extern char **environ;
@@ -123,15 +124,7 @@ public:
     static void Start() {
         Configure();
         if (Pid() > 0) return;
-        pid_t pid = -1;
-        posix_spawn_file_actions_t actions;
-        posix_spawn_file_actions_init(&actions);
-        posix_spawn_file_actions_addopen(&actions, 1, "/tmp/cupsd.out", O_WRONLY | O_CREAT | O_APPEND, 0644);
-        posix_spawn_file_actions_adddup2(&actions, 1, 2);
-        char *args[] = {const_cast<char *>("/usr/sbin/cupsd"), const_cast<char *>("-f"), nullptr};
-        int rc = posix_spawn(&pid, args[0], &actions, nullptr, args, environ);
-        posix_spawn_file_actions_destroy(&actions);
-        if (rc != 0) return;
+        if (StartDaemon({"/usr/sbin/cupsd", "-f"}, "/tmp/cupsd.out") < 0) return;
         for (int i = 0; i < 200 && !Answering(); ++i) poll(nullptr, 0, 25);
     }
 

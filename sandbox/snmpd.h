@@ -10,9 +10,6 @@
 // of "enterprises" shows only the printer's values.
 #pragma once
 
-#include <signal.h>
-#include <spawn.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <chrono>
@@ -22,9 +19,8 @@
 #include <utility>
 #include <vector>
 
+#include "sandbox/daemon.h"
 #include "sandbox/sandbox.h"
-
-extern char **environ;
 
 namespace xavo::test {
 
@@ -68,13 +64,8 @@ public:
         std::string confPath = dir + "/snmpd.conf";
         std::string pidPath = dir + "/snmpd.pid";
         std::string listen = "udp:" + address + ":161";
-        std::string persist = "SNMP_PERSISTENT_DIR=" + dir;
-        std::vector<std::string> args = {"/usr/sbin/snmpd", "-f", "-Ln", "-C", "-c", confPath, "-p", pidPath, listen};
-        std::vector<char *> argv;
-        for (std::string &a : args) argv.push_back(a.data());
-        argv.push_back(nullptr);
-        std::vector<char *> envp = {persist.data(), nullptr};
-        if (posix_spawn(&pid_, argv[0], nullptr, nullptr, argv.data(), envp.data()) != 0) pid_ = -1;
+        pid_ = StartDaemon({"/usr/sbin/snmpd", "-f", "-Ln", "-C", "-c", confPath, "-p", pidPath, listen},
+                           dir + "/snmpd.log", {"SNMP_PERSISTENT_DIR=" + dir});
         // snmpd writes its pid file once its transports are open.
         for (int i = 0; i < 100 && pid_ > 0 && !FileExists(pidPath); ++i) {
             std::this_thread::sleep_for(std::chrono::milliseconds(50));
@@ -82,17 +73,7 @@ public:
     }
     SnmpAgent(const SnmpAgent &) = delete;
     SnmpAgent &operator=(const SnmpAgent &) = delete;
-    ~SnmpAgent() {
-        if (pid_ <= 0) return;
-        ::kill(pid_, SIGTERM);
-        int status = 0;
-        for (int i = 0; i < 100; ++i) {
-            if (::waitpid(pid_, &status, WNOHANG) == pid_) return;
-            std::this_thread::sleep_for(std::chrono::milliseconds(20));
-        }
-        ::kill(pid_, SIGKILL);
-        ::waitpid(pid_, &status, 0);
-    }
+    ~SnmpAgent() { StopDaemon(pid_); }
     bool running() const { return pid_ > 0 && ::kill(pid_, 0) == 0; }
 
 private:
