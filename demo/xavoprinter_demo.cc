@@ -29,7 +29,6 @@
 #include <cstring>
 #include <exception>
 #include <memory>
-#include <optional>
 #include <regex>
 #include <string>
 #include <vector>
@@ -83,6 +82,22 @@ std::string Paint(const char *code, const std::string &text) {
 
 void Say(const std::string &text) { std::printf("%s\n", text.c_str()); std::fflush(stdout); }
 
+// An argv or envp view of words, which must outlive it.
+std::vector<char *> Pointers(const std::vector<std::string> &words) {
+    std::vector<char *> out;
+    for (const std::string &w : words) out.push_back(const_cast<char *>(w.c_str()));
+    out.push_back(nullptr);
+    return out;
+}
+
+// The child's exit status; -1 when it was killed.
+int WaitExit(pid_t pid) {
+    int status = 0;
+    while (waitpid(pid, &status, 0) < 0 && errno == EINTR) {
+    }
+    return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+}
+
 struct Ran {
     int status = -1;  // exit status, or -1 when it could not run or was killed
     std::string output;
@@ -99,14 +114,9 @@ Ran RunShown(const std::string &command, const std::vector<std::string> &env) {
     posix_spawn_file_actions_adddup2(&actions, fds[1], STDOUT_FILENO);
     posix_spawn_file_actions_adddup2(&actions, fds[1], STDERR_FILENO);
     posix_spawn_file_actions_addopen(&actions, STDIN_FILENO, "/dev/null", O_RDONLY, 0);
-    std::vector<std::string> args = {"/bin/sh", "-c", command};
-    std::vector<char *> argv;
-    for (std::string &a : args) argv.push_back(a.data());
-    argv.push_back(nullptr);
-    std::vector<std::string> envCopy = env;
-    std::vector<char *> envp;
-    for (std::string &e : envCopy) envp.push_back(e.data());
-    envp.push_back(nullptr);
+    const std::vector<std::string> args = {"/bin/sh", "-c", command};
+    std::vector<char *> argv = Pointers(args);
+    std::vector<char *> envp = Pointers(env);
     pid_t pid = -1;
     int rc = posix_spawn(&pid, "/bin/sh", &actions, nullptr, argv.data(), envp.data());
     posix_spawn_file_actions_destroy(&actions);
@@ -125,10 +135,7 @@ Ran RunShown(const std::string &command, const std::vector<std::string> &env) {
             }
         }
         if (!pending.empty()) Say("    " + pending);
-        int status = 0;
-        while (waitpid(pid, &status, 0) < 0 && errno == EINTR) {
-        }
-        ran.status = WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+        ran.status = WaitExit(pid);
     }
     close(fds[0]);
     return ran;
@@ -217,7 +224,6 @@ void SetTheStage() {
     xavo::test::SetUsblp(kUsbDev, {.deviceIdReply = xavo::test::UsblpReply(kUsbDeviceId)});
 
     xavo::test::PlaceSnmpClientConfig();
-    PlaceFile("/usr/xavo/etc/.keep", "");
 }
 
 int RunDemo(bool bShell, const std::string &cliDir, const std::string &preload) {
@@ -320,18 +326,10 @@ int RunDemo(bool bShell, const std::string &cliDir, const std::string &preload) 
         Say("'cat /usr/xavo/etc/printer.conf', 'testparm -s /etc/samba/smb.reserved.conf'.");
         Say("Leave with 'exit': the demo then unplugs the printer and cleans up.");
         pid_t pid = -1;
-        std::vector<std::string> envCopy = env;
-        std::vector<char *> envp;
-        for (std::string &e : envCopy) envp.push_back(e.data());
-        envp.push_back(nullptr);
-        char shell[] = "/bin/bash";
-        char noRc[] = "--norc";
-        char *argv[] = {shell, noRc, nullptr};
-        if (posix_spawn(&pid, shell, nullptr, nullptr, argv, envp.data()) == 0) {
-            int status = 0;
-            while (waitpid(pid, &status, 0) < 0 && errno == EINTR) {
-            }
-        }
+        const std::vector<std::string> args = {"/bin/bash", "--norc"};
+        std::vector<char *> argv = Pointers(args);
+        std::vector<char *> envp = Pointers(env);
+        if (posix_spawn(&pid, argv[0], nullptr, nullptr, argv.data(), envp.data()) == 0) WaitExit(pid);
         // Ctrl-C typed in the shell reached the demo too: it was meant for
         // the shell's commands.
         g_stop = 0;
