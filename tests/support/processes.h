@@ -1,0 +1,43 @@
+// Several processes of the appliance calling the library at the same time.
+#pragma once
+
+#include <gtest/gtest.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <functional>
+#include <vector>
+
+#include "sandbox/sandbox.h"
+
+namespace xavo::test {
+
+// Runs body(0) .. body(n - 1) in n forked processes that all start when
+// the last one is forked, with real sleeps so that a lock try waits for its
+// holder; each body answers whether its process did all it should.
+inline void RunAtOnce(int n, const std::function<bool(int)> &body) {
+    SetRealSleep(true);
+    int go[2];
+    ASSERT_EQ(pipe(go), 0);
+    std::vector<pid_t> children;
+    for (int i = 0; i < n; ++i) {
+        const pid_t pid = fork();
+        if (pid == 0) {
+            close(go[1]);
+            char c;
+            (void)!read(go[0], &c, 1);  // returns when the parent closes its end
+            _exit(body(i) ? 0 : 1);
+        }
+        EXPECT_GT(pid, 0) << "fork";
+        if (pid > 0) children.push_back(pid);
+    }
+    close(go[0]);
+    close(go[1]);
+    for (pid_t pid : children) {
+        int status = 0;
+        EXPECT_EQ(waitpid(pid, &status, 0), pid);
+        EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << "process " << pid;
+    }
+}
+
+}  // namespace xavo::test
