@@ -12,6 +12,15 @@
 
 namespace xavo::test {
 
+// Whether body, run in a forked child, answered true (a child that did not
+// exit normally answers false).
+inline bool InChild(const std::function<bool()> &body) {
+    const pid_t pid = fork();
+    if (pid == 0) _exit(body() ? 0 : 1);
+    int status = -1;
+    return pid > 0 && waitpid(pid, &status, 0) == pid && WIFEXITED(status) && WEXITSTATUS(status) == 0;
+}
+
 // Runs body(0) .. body(n - 1) in n forked processes that all start when
 // the last one is forked, with real sleeps so that a lock try waits for its
 // holder; each body answers whether its process did all it should.
