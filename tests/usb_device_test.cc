@@ -12,29 +12,31 @@
 #include "xavoprinter.h"
 
 using ::testing::ElementsAre;
-using xavo::test::GetUsblp;
-using xavo::test::Logs;
-using xavo::test::SetUsblp;
-using xavo::test::TakeSleeps;
-using xavo::test::UsblpConfig;
+using namespace xavo::test;
 
 namespace {
 
 std::vector<std::uint64_t> Seconds(int n) { return std::vector<std::uint64_t>(n, 1000000); }
 
-TEST(UsblpOpen, NamesBecomePathsUnderDevUsbUnlessTheyAreFullPaths) {
-    SetUsblp("lp0", UsblpConfig{});
-    SetUsblp("lp1", UsblpConfig{});
+TEST(UsblpOpen, NamesBecomePathsUnderDevUsbAndAnAbsentDeviceFailsAtOnce) {
+    for (const char *name : {"lp0", "lp1"}) SetUsblp(name, {});
     for (auto [name, node] : {std::pair{"lp0", "lp0"}, std::pair{"/dev/usb/lp1", "lp1"}}) {
         int fd = XAVOPrinterDevOpen(name, 0);
         EXPECT_GE(fd, 0) << name;
         EXPECT_EQ(GetUsblp(node).openNow, 1) << name;
         close(fd);
     }
-    EXPECT_EQ(XAVOPrinterDevOpen("dev/lp0", 0), -1);  // "/dev/usb/dev/lp0"
+    EXPECT_EQ(XAVOPrinterDevOpen("dev/lp0", 8), -1);  // "/dev/usb/dev/lp0"
     EXPECT_EQ(GetUsblp("lp0").opens, 1);
     EXPECT_EQ(XAVOPrinterDevOpen(nullptr, 3), -1);
-    EXPECT_THAT(Logs(), ElementsAre("3 printer_device_open:N bad parameter."));
+    char szBuf[16] = "untouched";
+    EXPECT_EQ(XAVOPrinterGetStringId("lp2", szBuf, sizeof szBuf), -1);
+    EXPECT_STREQ(szBuf, "untouched");
+    EXPECT_EQ(XAVOResetPrinter("lp2"), -1);
+    EXPECT_THAT(Logs(), ElementsAre("3 printer_device_open:N bad parameter.",
+                                    "7 printer_get_string_id:N open device [lp2] error:(2) No such file or directory",
+                                    "3 printer_reset_printer:N open device [lp2] error:(2) No such file or directory"));
+    EXPECT_TRUE(TakeSleeps().empty());
 }
 
 TEST(UsblpOpen, BusyDeviceIsRetriedOncePerSecondUpToTheLimit) {
@@ -45,10 +47,8 @@ TEST(UsblpOpen, BusyDeviceIsRetriedOncePerSecondUpToTheLimit) {
         bool opened;
     } cases[] = {{3, 8, true}, {8, 8, true}, {9, 8, false}, {1, 0, false}, {0, 0, true}};
     for (const auto &c : cases) {
-        xavo::test::ResetSandbox();
-        UsblpConfig config;
-        config.busyOpens = c.busyOpens;
-        SetUsblp("lp0", config);
+        ResetSandbox();
+        SetUsblp("lp0", {.busyOpens = c.busyOpens});
         int fd = XAVOPrinterDevOpen("lp0", c.nRetry);
         const int waits = std::min(c.busyOpens, c.nRetry);
         std::vector<std::string> expected(waits, busy);
@@ -61,28 +61,11 @@ TEST(UsblpOpen, BusyDeviceIsRetriedOncePerSecondUpToTheLimit) {
     }
 }
 
-TEST(UsblpOpen, AbsentDeviceFailsSilentlyButTheCallersReportIt) {
-    UsblpConfig absent;
-    absent.present = false;
-    SetUsblp("lp0", absent);
-    EXPECT_EQ(XAVOPrinterDevOpen("lp0", 8), -1);
-    char szBuf[16] = "untouched";
-    EXPECT_EQ(XAVOPrinterGetStringId("lp0", szBuf, sizeof szBuf), -1);
-    EXPECT_STREQ(szBuf, "untouched");
-    EXPECT_EQ(XAVOResetPrinter("lp0"), -1);
-    EXPECT_THAT(Logs(), ElementsAre("7 printer_get_string_id:N open device [lp0] error:(2) No such file or directory",
-                                    "3 printer_reset_printer:N open device [lp0] error:(2) No such file or directory"));
-    EXPECT_TRUE(TakeSleeps().empty());
-}
-
 TEST(UsblpDeviceId, RefusedRequestsAreRetriedEightTimesASecondApart) {
     const std::string retry = "3 printer_get_string_id:N ioctl LPIOC_GET_DEVICE_ID error:(5) Input/output error";
     for (int failures : {0, 3, 8, 12}) {
-        xavo::test::ResetSandbox();
-        UsblpConfig config;
-        config.deviceIdFailures = failures;
-        config.deviceIdReply = xavo::test::UsblpReply("MFG:ACME;");
-        SetUsblp("lp0", config);
+        ResetSandbox();
+        SetUsblp("lp0", {.deviceIdFailures = failures, .deviceIdReply = UsblpReply("MFG:ACME;")});
         char szBuf[64] = {};
         const int attempts = std::min(failures, 8);
         EXPECT_EQ(XAVOPrinterGetStringId("lp0", szBuf, sizeof szBuf), failures < 8 ? 0 : -1);
@@ -98,50 +81,40 @@ TEST(UsblpDeviceId, RefusedRequestsAreRetriedEightTimesASecondApart) {
 }
 
 TEST(UsblpDeviceId, ReplyIsCutToTheCallersBufferAndAnswersTheStatedLength) {
-    auto raw = [](unsigned char hi, unsigned char lo, const std::string &text) {
-        return std::string{static_cast<char>(hi), static_cast<char>(lo)} + text;
-    };
+    auto raw = [](int hi, int lo, const std::string &text) { return std::string{char(hi), char(lo)} + text; };
     struct {
         std::string reply;
         int32_t cbBuf, result;
         std::string text;
     } cases[] = {
-        {xavo::test::UsblpReply("MFG:A;"), 64, 0, "MFG:A;"},
+        {UsblpReply("MFG:A;"), 64, 0, "MFG:A;"},
         {raw(0x01, 0x80, "MFG:A;"), 64, 384, "MFG:A;"},  // big-endian length
         {raw(0x01, 0x2c, std::string(300, 'x')), 100, 300, std::string(99, 'x')},
         {raw(0x00, 0x64, std::string(300, 'x')), 100, 0, std::string(99, 'x')},
         {raw(0xff, 0xff, "MDL:X;"), 64, 65535, "MDL:X;"},  // states more than came
         // Fills the driver's whole buffer with no NUL in it.
         {raw(0x10, 0x00, std::string(5000, 'y')), 8192, 0, std::string(4093, 'y')},
-        {xavo::test::UsblpReply("MFG:A;"), 1, 8, ""},
+        {UsblpReply("MFG:A;"), 1, 8, ""},
     };
     for (const auto &c : cases) {
-        UsblpConfig config;
-        config.deviceIdReply = c.reply;
-        SetUsblp("lp0", config);
+        SetUsblp("lp0", {.deviceIdReply = c.reply});
         // Guard bytes behind the caller's buffer show any write past it.
         std::vector<char> buf(static_cast<size_t>(c.cbBuf) + 16, '#');
         EXPECT_EQ(XAVOPrinterGetStringId("lp0", buf.data(), c.cbBuf), c.result) << c.cbBuf;
         EXPECT_EQ(std::string(buf.data()), c.text);
         EXPECT_EQ(std::string(buf.end() - 16, buf.end()), std::string(16, '#'));
-        EXPECT_EQ(GetUsblp("lp0").openNow, 0);
     }
     EXPECT_TRUE(Logs().empty());
 }
 
 TEST(UsblpReset, AcceptedOrRefusedAndTheDeviceIsClosed) {
-    for (bool accepted : {true, false}) {
-        xavo::test::ResetSandbox();
-        UsblpConfig config;
-        config.resetAccepted = accepted;
-        SetUsblp("lp0", config);
-        EXPECT_EQ(XAVOResetPrinter("lp0"), accepted ? 0 : -1);
-        EXPECT_EQ(GetUsblp("lp0").requests, std::vector<std::uint32_t>{0x5009});
-        EXPECT_EQ(GetUsblp("lp0").openNow, 0);
-        std::vector<std::string> expected;
-        if (!accepted) expected = {"3 printer_reset_printer:N ioctl LPIOC_SOFT_RESET error:(5) Input/output error"};
-        EXPECT_EQ(Logs(), expected);
-    }
+    SetUsblp("lp0", {});
+    EXPECT_EQ(XAVOResetPrinter("lp0"), 0);
+    SetUsblp("lp0", {.resetAccepted = false});
+    EXPECT_EQ(XAVOResetPrinter("lp0"), -1);
+    EXPECT_EQ(GetUsblp("lp0").requests, (std::vector<std::uint32_t>{0x5009, 0x5009}));
+    EXPECT_EQ(GetUsblp("lp0").openNow, 0);
+    EXPECT_THAT(Logs(), ElementsAre("3 printer_reset_printer:N ioctl LPIOC_SOFT_RESET error:(5) Input/output error"));
 }
 
 }  // namespace
