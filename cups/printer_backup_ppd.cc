@@ -1,9 +1,11 @@
 #include <syslog.h>
 
 #include <cstdio>
+#include <cstring>
 
 #include "cups/queue_create.h"
 #include "internal/log.h"
+#include "internal/name_path.h"
 #include "xavoprinter.h"
 
 namespace {
@@ -13,9 +15,16 @@ constexpr char kLogCopyFailed[] = "%s:%d cp -f %s %s failed";
 constexpr char kMkdirPath[] = "/bin/mkdir";
 constexpr char kCpPath[] = "/bin/cp";
 constexpr int kDestSize = 256;
+constexpr char kCondKeptName[] = "((void *)0) == strpbrk(szPrinterId, \"/*?[\")";
+constexpr char kCondDestFits[] =
+    "sizeof(szDest) > snprintf(szDest, sizeof(szDest), \"/etc/cups/ppd/%s.ppd\", szPrinterId)";
 }  // namespace
 
 namespace xavo {
+
+bool KeptPpdName(const char *szPrinterId) {
+    return std::strchr(szPrinterId, '/') == nullptr && !HoldsFilePattern(szPrinterId);
+}
 
 int32_t PrinterBackupPpd(const char *szPpdFile, const char *szPrinterId) {
     if (!XARG_OK(szPpdFile != nullptr, "((void *)0) != szPpdFile") ||
@@ -24,13 +33,19 @@ int32_t PrinterBackupPpd(const char *szPpdFile, const char *szPrinterId) {
         !XARG_OK(szPrinterId[0] != '\0', "0 != szPrinterId[0]")) {
         return -1;
     }
+    // Refused before anything runs.  The destination's buffer holds 256
+    // bytes; a printer ID too long for it is refused rather than cut, since
+    // a cut ID is another printer's ID and its copy would be overwritten.
+    char szDest[kDestSize] = {};
+    if (!XARG_OK(KeptPpdName(szPrinterId), kCondKeptName) ||
+        !XARG_OK(NamePath(szDest, kPpdPathFormat, szPrinterId), kCondDestFits)) {
+        return -1;
+    }
     if (ORLICExec(kMkdirPath, "-p", kPpdDir, nullptr, nullptr) != 0) {
         XLOG(LOG_ERR, kLogMkdirFailed, kPpdDir);
         XSETERR(ERR_EXEC);
         return -1;
     }
-    char szDest[kDestSize] = {};
-    std::snprintf(szDest, sizeof szDest, kPpdPathFormat, szPrinterId);
     if (ORLICExec(kCpPath, "-f", szPpdFile, szDest, nullptr) != 0) {
         XLOG(LOG_ERR, kLogCopyFailed, szPpdFile, szDest);
         XSETERR(ERR_EXEC);

@@ -4,6 +4,7 @@
 #include "internal/boundary.h"
 #include "internal/guards.h"
 #include "internal/log.h"
+#include "internal/name_path.h"
 #include "xavoprinter.h"
 
 namespace {
@@ -13,12 +14,15 @@ constexpr int kPathSize = 388;
 
 XAVO_EXPORT char *XAVOCupsGetPPD(const char *szPpdName) noexcept {
     return XAVO_BOUNDARY(static_cast<char *>(nullptr), [&]() -> char * {
-        if (szPpdName == nullptr) {
+        // The name is a base name under "/etc/cups/ppd/": one that holds
+        // "/" would read any file, and one too long for the 388-byte path
+        // is refused rather than cut (cutting ".ppd" off opens the name
+        // itself, whatever it points at).
+        char szPath[kPathSize] = {};
+        if (szPpdName == nullptr || !xavo::NamePath(szPath, xavo::kPpdPathFormat, szPpdName)) {
             XSETERR(ERR_BAD_PARAMETERS);
             return nullptr;
         }
-        char szPath[kPathSize] = {};
-        std::snprintf(szPath, sizeof szPath, xavo::kPpdPathFormat, szPpdName);
         xavo::File file(std::fopen(szPath, "r"));
         if (!file) {
             XSETERR(ERR_OPEN);

@@ -8,6 +8,7 @@
 #include <cstring>
 
 #include "internal/log.h"
+#include "internal/name_path.h"
 #include "internal/text.h"
 #include "xavoprinter.h"
 
@@ -40,8 +41,11 @@ PpdChoice PpdChoose(const char *szPpdFile, const char *szPrinterId, const char *
     PpdChoice choice;
     struct stat st;
     if (szPpdFile == nullptr || szPpdFile[0] == '\0') {
-        std::snprintf(choice.szPath, sizeof choice.szPath, kPpdPathFormat, szPrinterId);
-        choice.bUse = ::stat(choice.szPath, &st) == 0;
+        // An ID that cannot name a kept copy, or too long for the 512-byte
+        // path whole, has none: a cut or redirected path would hand the
+        // queue another printer's file.
+        choice.bUse = KeptPpdName(szPrinterId) && NamePath(choice.szPath, kPpdPathFormat, szPrinterId) &&
+                      ::stat(choice.szPath, &st) == 0;
         return choice;
     }
     if (::stat(szPpdFile, &st) != 0) {

@@ -29,6 +29,13 @@ bool SchedulerRunning();
 // Copies szPpdFile to the kept copy "/etc/cups/ppd/<printer ID>.ppd".
 int32_t PrinterBackupPpd(const char *szPpdFile, const char *szPrinterId);
 
+// Whether a printer ID can name a kept copy: it holds no "/" (the copy
+// would land in another directory) and no file name pattern character (the
+// copy's path goes to "/bin/cp" through the platform's runner, and a USB
+// printer's ID carries the serial number the device reports).  The library
+// never keeps a copy under any other ID, so none is ever looked for either.
+bool KeptPpdName(const char *szPrinterId);
+
 // The PPD file a new queue is created with: the caller's file (kept as the
 // printer's copy on the way), or the printer's kept copy, or none.
 struct PpdChoice {

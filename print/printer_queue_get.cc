@@ -8,6 +8,7 @@
 
 #include "internal/boundary.h"
 #include "internal/log.h"
+#include "internal/name_path.h"
 #include "internal/text.h"
 #include "share/usbip_paths.h"
 #include "xavoprinter.h"
@@ -20,6 +21,8 @@ constexpr char kLogCannotRefine[] = "%s:%d cannot refine printer queue name";
 constexpr char kKeyQueue[] = "QUEUE";
 constexpr char kCupsJobsRemark[] = "(CUPS Jobs";
 constexpr size_t kPathSize = 256;
+constexpr char kCondNoSlash[] = "((void *)0) == strchr(szPrinterId, '/')";
+constexpr char kCondPathFits[] = "sizeof(szPath) > snprintf(szPath, sizeof(szPath), \"/tmp/usbip_%s\", szPrinterId)";
 constexpr size_t kValueSize = 4096;
 // The remark's opening part that is replaced: "(" and at most six more
 // characters, so a longer remark keeps its tail behind the new text.
@@ -34,8 +37,14 @@ XAVO_EXPORT int32_t XAVOPrinterQueueGet(const char *szPrinterId, char *szBuf, in
             !XARG_OK(szBuf != nullptr, "((void *)0) != szBuf") || !XARG_OK(cbBuf > 0, "0 < cbBuf")) {
             return -1;
         }
+        // The status file's path is built in 256 bytes: a printer ID that
+        // holds "/" or does not fit whole is refused rather than cut into
+        // another file's name.
         char szPath[kPathSize];
-        std::snprintf(szPath, sizeof szPath, xavo::kUsbipStatusFormat, szPrinterId);
+        if (!XARG_OK(std::strchr(szPrinterId, '/') == nullptr, kCondNoSlash) ||
+            !XARG_OK(xavo::NamePath(szPath, xavo::kUsbipStatusFormat, szPrinterId), kCondPathFits)) {
+            return -1;
+        }
 
         char szValue[kValueSize];
         std::memset(szValue, 0, sizeof szValue);

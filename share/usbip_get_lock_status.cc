@@ -4,6 +4,7 @@
 
 #include "internal/boundary.h"
 #include "internal/log.h"
+#include "internal/name_path.h"
 #include "internal/text.h"
 #include "share/usbip_paths.h"
 #include "xavoprinter.h"
@@ -18,12 +19,15 @@ constexpr size_t kPathSize = 4096;
 
 XAVO_EXPORT int32_t XAVOPrinterUsbipGetLockStatus(const char *szPrinterId, char *szBuf, int32_t cbBuf) noexcept {
     return XAVO_BOUNDARY(-1, [&] {
-        if (szBuf == nullptr || cbBuf <= 0 || szPrinterId == nullptr) {
+        // A printer ID that holds "/" would read another directory's file,
+        // and one too long for the 4096-byte path is refused rather than
+        // cut into another printer's status file.
+        char szPath[kPathSize];
+        if (szBuf == nullptr || cbBuf <= 0 || szPrinterId == nullptr ||
+            !xavo::NamePath(szPath, xavo::kUsbipStatusFormat, szPrinterId)) {
             XSETERR(ERR_BAD_PARAMETERS);
             return -1;
         }
-        char szPath[kPathSize];
-        std::snprintf(szPath, sizeof szPath, xavo::kUsbipStatusFormat, szPrinterId);
         // The service's text is passed through unchanged, whatever it is.
         if (ORLICFileGetKeyValue(szPath, kKeyLock, szBuf, cbBuf, 0) < 0) xavo::CopyText(szBuf, cbBuf, kLockFree);
         return 0;

@@ -19,7 +19,11 @@
 
 using ::testing::ElementsAre;
 using ::testing::EndsWith;
+using ::testing::Eq;
+using ::testing::HasSubstr;
 using ::testing::IsSupersetOf;
+using ::testing::Matcher;
+using ::testing::Not;
 using ::testing::StartsWith;
 using namespace xavo::test;
 
@@ -210,4 +214,94 @@ TEST_F(CupsFaults, KeptPpdTextAndItsErrorCodes) {
     }
     EXPECT_EQ(XAVOCupsGetPPD(nullptr), nullptr);
     EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
+}
+
+namespace {
+// Every .ppd file under the kept copies' directory and /tmp, sorted.
+std::vector<std::string> PpdFiles() {
+    return Lines(Tool({"/bin/sh", "-c", "find /etc/cups/ppd /tmp -name '*.ppd' | sort"}));
+}
+}  // namespace
+
+// A printer ID that holds "/" or a pattern character, or is too long for the
+// copy's path, gets no kept copy: the copy fails as a bad argument, nothing
+// is written anywhere, and the queue is made from the caller's file.
+TEST_F(CupsFaults, PpdCopyIsRefusedForIdsThatCannotNameAKeptCopy) {
+    const std::string kName = "((void *)0) == strpbrk(szPrinterId, \"/*?[\")";
+    const std::string kFits =
+        "sizeof(szDest) > snprintf(szDest, sizeof(szDest), \"/etc/cups/ppd/%s.ppd\", szPrinterId)";
+    struct { std::string id; bool bNet; std::string condition; } const cases[] = {
+        {"04b8:0005:SN*", false, kName},
+        {"04b8:0005:SN?001", false, kName},
+        {"04b8:0005:SN[0]001", false, kName},
+        {"04b8:0005:x/../../../../tmp/stolen", false, kName},  // the directory exists: cp would write there
+        {"04b8:0005:" + std::string(228, 'L'), false, kFits},     // the path needs 257 bytes: cut, ".ppd" is lost
+        {"10.0.0.5-of?ice", true, kName},
+    };
+    PlaceProgram("/usr/bin/lpadmin", Recorder(0));
+    PlaceProgram("/usr/bin/cupsdisable", Recorder(0));
+    PlaceFile("/tmp/new.ppd", "*PPD-Adobe: \"4.3\"\n");
+    PlaceFile("/etc/cups/ppd/04b8:0005:SN0001.ppd", "OTHER PRINTER");
+    PlaceFile("/etc/cups/ppd/10.0.0.5-office.ppd", "OFFICE");
+    PlaceFile("/etc/cups/ppd/04b8:0005:x/placeholder", "");
+    const std::vector<std::string> before = PpdFiles();
+    for (const auto &c : cases) {
+        SCOPED_TRACE(c.id.substr(0, 40));
+        NetPrinterConf conf = NetRecord("10.0.0.5", "of?ice", "socket");
+        EXPECT_EQ(c.bNet ? XAVOPrinterNetCupsAdd(&conf, "/tmp/new.ppd") : XAVOPrinterCupsAdd(c.id.c_str(), "/tmp/new.ppd"),
+                  0);
+        EXPECT_THAT(Runs().front(), EndsWith(" -P /tmp/new.ppd"));
+        const std::string unit = c.bNet ? "printer_net_cups_add" : "printer_cups_printer_add";
+        const std::string refused = "3 printer_backup_ppd:N Invaild Argument (" + c.condition + ")=[0]\n";
+        const std::string failed = "3 " + unit + ":N Failed to backup ppd file: /tmp/new.ppd[0x0D00 printer_backup_ppd:";
+        EXPECT_THAT(Logs(), IsSupersetOf<std::vector<Matcher<std::string>>>({Eq(refused), StartsWith(failed)}));
+        EXPECT_EQ(PpdFiles(), before);
+    }
+    EXPECT_EQ(ReadFile("/etc/cups/ppd/04b8:0005:SN0001.ppd"), "OTHER PRINTER");
+    EXPECT_EQ(ReadFile("/etc/cups/ppd/10.0.0.5-office.ppd"), "OFFICE");
+    // The longest ID whose copy fits is still kept.
+    const std::string fits = "04b8:0005:" + std::string(227, 'L');
+    EXPECT_EQ(XAVOPrinterCupsAdd(fits.c_str(), "/tmp/new.ppd"), 0);
+    EXPECT_EQ(ReadFile("/etc/cups/ppd/" + fits + ".ppd"), "*PPD-Adobe: \"4.3\"\n");
+}
+
+// Without a file from the caller, a kept copy is looked for only under an ID
+// the library would keep one under: a file planted where the ID's path
+// leads is never handed to the queue.
+TEST_F(CupsFaults, KeptCopyIsNotLookedForUnderAnIdThatCannotNameOne) {
+    PlaceProgram("/usr/bin/lpadmin", Recorder(0));
+    PlaceProgram("/usr/bin/cupsdisable", Recorder(0));
+    PlaceFile("/etc/cups/ppd/04b8:0005:SN*.ppd", "PLANTED");
+    PlaceFile("/etc/cups/ppd/04b8:0005:x/placeholder", "");
+    PlaceFile("/tmp/planted.ppd", "PLANTED");
+    for (const char *szId : {"04b8:0005:SN*", "04b8:0005:x/../../../../tmp/planted"}) {
+        EXPECT_EQ(XAVOPrinterCupsAdd(szId, nullptr), 0);
+        EXPECT_THAT(Runs().front(), Not(HasSubstr(" -P "))) << szId;
+    }
+    PlaceFile("/etc/cups/ppd/04b8:0005:SN0001.ppd", "KEPT");
+    EXPECT_EQ(XAVOPrinterCupsAdd(kA, nullptr), 0);
+    EXPECT_THAT(Runs().front(), EndsWith(" -P /etc/cups/ppd/04b8:0005:SN0001.ppd"));
+}
+
+// The name is a base name under "/etc/cups/ppd/": a "/" or a name whose
+// path would not fit the 388-byte buffer whole is a bad argument.
+TEST_F(CupsFaults, KeptPpdTextIsNeverReadOutsideTheDirectoryOrFromACutPath) {
+    std::string traversal = "../../../";
+    for (int i = 0; i < 177; ++i) traversal += "./";
+    traversal += "etc/passwd";  // 373 characters: the cut path loses ".ppd"
+    PlaceFile("/etc/cups/ppd/x/y.ppd", "NESTED");
+    struct { std::string name; uint32_t uError; } const cases[] = {
+        {traversal, ERR_BAD_PARAMETERS},
+        {"../ppd/full", ERR_BAD_PARAMETERS},
+        {"x/y", ERR_BAD_PARAMETERS},
+        {std::string(370, 'n'), ERR_BAD_PARAMETERS},  // 388 bytes with its NUL
+        {std::string(369, 'n'), ERR_OPEN},            // fits whole; no such file
+    };
+    PlaceFile("/etc/cups/ppd/full.ppd", "FULL");
+    for (const auto &c : cases) {
+        ORLICErrSetEx(0, "", 0);
+        EXPECT_EQ(XAVOCupsGetPPD(c.name.c_str()), nullptr) << c.name.substr(0, 20);
+        EXPECT_EQ(ORLICErrGet(), c.uError) << c.name.substr(0, 20);
+    }
+    EXPECT_TRUE(Logs().empty());
 }

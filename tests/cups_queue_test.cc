@@ -126,6 +126,24 @@ TEST_F(CupsQueues, GivenPpdIsKeptByPrinterIdAndServesLaterCreations) {
     EXPECT_FALSE(Queue("usbprinter2").exists);
 }
 
+// A serial number that makes the ID a file name pattern: the copy is refused
+// as a bad argument, another printer's kept copy stays, and the queue is
+// made from the caller's file all the same.
+TEST_F(CupsQueues, PatternInThePrinterIdNeverOverwritesAnotherKeptCopy) {
+    const char kPatternId[] = "04b8:0005:SN*";
+    PlaceFile(kConf, ReadFile(kConf) + "\n[" + kPatternId + "]\n\tproducer = ACME\n");  // registered
+    PlaceFile("/etc/cups/ppd/04b8:0005:SN0001.ppd", "OTHER PRINTER");
+    PlaceFile("/tmp/new.ppd", kPpdText);
+    ASSERT_EQ(XAVOPrinterCupsAdd(kPatternId, "/tmp/new.ppd"), 0);
+    EXPECT_EQ(ReadFile("/etc/cups/ppd/04b8:0005:SN0001.ppd"), "OTHER PRINTER");
+    EXPECT_FALSE(FileExists("/etc/cups/ppd/04b8:0005:SN*.ppd"));
+    EXPECT_THAT(Logs(), Contains(StartsWith("3 printer_cups_printer_add:N Failed to backup ppd file: "
+                                            "/tmp/new.ppd[0x0D00 printer_backup_ppd:")));
+    EXPECT_EQ(Queue("usbprinter1").deviceUri, std::string("usb:/dev/usb/") + kPatternId);
+    EXPECT_TRUE(FileExists("/etc/cups/ppd/usbprinter1.ppd"));  // CUPS's own copy of the caller's file
+    EXPECT_EQ(StoredName(kPatternId), "usbprinter1");
+}
+
 TEST_F(CupsQueues, NetworkQueueIsCreatedEnabledWithItsPpd) {
     PlaceFile("/tmp/model.ppd", kPpdText);
     NetPrinterConf conf = NetRecord("10.0.0.11", "office", "socket");

@@ -3,6 +3,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <cstdio>
 #include <string>
 #include <vector>
 
@@ -160,6 +161,45 @@ TEST(StatusArguments, BadArgumentsFailWithBadParameters) {
         EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
         EXPECT_THAT(Logs(), IsEmpty());
     }
+}
+
+// The status file's path is built from the printer ID: one that holds "/"
+// or would be cut to fit the path's buffer is refused, never read.  A cut
+// queue-text path (256 bytes) would read another printer's file.
+TEST(StatusArguments, PrinterIdThatLeavesTheDirectoryOrIsCutIsRefused) {
+    const std::string fitsQueue(244, 'q');  // "/tmp/usbip_" + 244: 255 characters, fits 256 bytes
+    // Written in place: the name leaves no room for a temporary file's suffix.
+    std::FILE *other = std::fopen(("/tmp/usbip_" + fitsQueue).c_str(), "w");
+    ASSERT_NE(other, nullptr);
+    std::fputs("QUEUE=\"other printer\"\n", other);
+    std::fclose(other);
+    xavo::test::PlaceFile("/tmp/usbip_dir/x", "QUEUE=\"elsewhere\"\nLOCK=\"Locked\"\n");
+    const std::string condSlash = "((void *)0) == strchr(szPrinterId, '/')";
+    const std::string condFits = "sizeof(szPath) > snprintf(szPath, sizeof(szPath), \"/tmp/usbip_%s\", szPrinterId)";
+    struct { std::string id; std::string condition; } const queueCases[] = {
+        {"dir/x", condSlash}, {"../tmp/usbip_dir/x", condSlash}, {fitsQueue + "q", condFits}};
+    char szBuf[64];
+    for (const auto &c : queueCases) {
+        ORLICErrSetEx(0, "test", 0);
+        EXPECT_EQ(XAVOPrinterQueueGet(c.id.c_str(), szBuf, sizeof szBuf), -1) << c.id;
+        EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
+        EXPECT_THAT(Logs(), ElementsAre("3 printer_queue_get:N Invaild Argument (" + c.condition + ")=[0]\n"));
+    }
+    ASSERT_EQ(XAVOPrinterQueueGet(fitsQueue.c_str(), szBuf, sizeof szBuf), 0);
+    EXPECT_STREQ(szBuf, "other printer");
+    // The lock status path has 4096 bytes: 4085 characters of ID are one too many.
+    const std::string lockCases[] = {"dir/x", "../tmp/usbip_dir/x", std::string(4085, 'l')};
+    for (const auto &id : lockCases) {
+        ORLICErrSetEx(0, "test", 0);
+        std::string buf(64, 'x');
+        EXPECT_EQ(XAVOPrinterUsbipGetLockStatus(id.c_str(), buf.data(), 64), -1) << id.substr(0, 20);
+        EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
+        EXPECT_EQ(buf, std::string(64, 'x'));
+    }
+    std::string buf(64, 'x');
+    EXPECT_EQ(XAVOPrinterUsbipGetLockStatus(std::string(4084, 'l').c_str(), buf.data(), 64), 0);
+    EXPECT_STREQ(buf.c_str(), "Free");
+    EXPECT_THAT(Logs(), IsEmpty());
 }
 
 }  // namespace
