@@ -27,18 +27,15 @@ BrandModel WalkDeviceIdPairs(std::string_view id) {
         if (colon == std::string_view::npos) break;  // no more pairs
         size_t end = id.find(';', colon + 1);
         if (end == std::string_view::npos) end = id.size();
+        // The key runs to the next ":", a ";" inside it included: in
+        // "CLS;MDL:X;" the key is "CLS;MDL", which names no model.
         std::string_view key = id.substr(at, colon - at);
         std::string_view value = id.substr(colon + 1, end - colon - 1);
-        // A pair that cannot be read (a ";" before its ":", an empty or
-        // overlong key) is stepped over rather than ending the walk: one
-        // malformed pair from a printer should not hide the model after it.
-        size_t semicolonInKey = key.find(';');
-        if (semicolonInKey != std::string_view::npos) {
-            at += semicolonInKey + 1;
-            continue;
-        }
-        // An empty value is not taken as found, so that a later pair that
-        // carries the item can still give it.
+        // A pair that cannot be read (an empty or overlong key) is stepped
+        // over rather than ending the walk: one malformed pair from a
+        // printer should not hide the model after it.  An empty value is
+        // not taken as found, so that a later pair that carries the item
+        // can still give it.
         if (!key.empty() && key.size() <= kMaxPairPart && !value.empty()) {
             value = value.substr(0, kMaxPairPart);
             if (!found.brand && (key == "MFG" || key == "MANUFACTURER")) {

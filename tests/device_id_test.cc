@@ -98,6 +98,24 @@ void StoreStringId(const char *szPrinterId, const char *szStringId) {
     xavo::test::WriteSection(kConf, szPrinterId, {{"usblp string id", szStringId}});
 }
 
+// Brand and model that the pair walk finds in a stored device ID string,
+// starting from "keep" in both; no other field of the record is written.
+std::pair<std::string, std::string> Detect(const std::string &id) {
+    xavo::test::ResetSandbox();
+    StoreStringId("printer", id.c_str());
+    UsbPrinterConf conf;
+    std::memset(&conf, 'z', sizeof conf);
+    std::strcpy(conf.szPrinterId, "printer");
+    std::strcpy(conf.szBrand, "keep");
+    std::strcpy(conf.szModel, "keep");
+    UsbPrinterConf before = conf;
+    EXPECT_EQ(XAVOPrinterModelDetect(&conf), 0) << id;
+    std::memcpy(before.szBrand, conf.szBrand, sizeof conf.szBrand);
+    std::memcpy(before.szModel, conf.szModel, sizeof conf.szModel);
+    EXPECT_EQ(std::memcmp(&before, &conf, sizeof conf), 0) << "no other field written";
+    return {conf.szBrand, conf.szModel};
+}
+
 // The first MFG/MANUFACTURER and MDL/MODEL pairs with a value give brand
 // and model, cut to their fields; keys match exactly, values run to ';'.
 TEST(ModelDetect, TakesTheFirstPairOfEachItemExactly) {
@@ -114,21 +132,26 @@ TEST(ModelDetect, TakesTheFirstPairOfEachItemExactly) {
         {"MFG:" + brand + ";MDL:" + model + ";", brand.substr(0, 127), model.substr(0, 127)},
     };
     for (const auto &c : cases) {
-        xavo::test::ResetSandbox();
-        StoreStringId("printer", c.id.c_str());
-        UsbPrinterConf conf;
-        std::memset(&conf, 'z', sizeof conf);
-        std::strcpy(conf.szPrinterId, "printer");
-        std::strcpy(conf.szBrand, "keep");
-        std::strcpy(conf.szModel, "keep");
-        UsbPrinterConf before = conf;
-        ASSERT_EQ(XAVOPrinterModelDetect(&conf), 0);
-        EXPECT_EQ(conf.szBrand, c.brand) << c.id.substr(0, 80);
-        EXPECT_EQ(conf.szModel, c.model) << c.id.substr(0, 80);
-        std::memcpy(before.szBrand, conf.szBrand, sizeof conf.szBrand);
-        std::memcpy(before.szModel, conf.szModel, sizeof conf.szModel);
-        EXPECT_EQ(std::memcmp(&before, &conf, sizeof conf), 0) << "no other field written";
+        EXPECT_EQ(Detect(c.id), std::make_pair(c.brand, c.model)) << c.id.substr(0, 80);
     }
+}
+
+// A key is everything up to the next ":", so a ";" before it belongs to the
+// key: "CLS;MDL" names no model, and the walk goes on after its value.
+TEST(ModelDetect, KeyRunsToTheNextColonThroughSemicolons) {
+    struct {
+        std::string id, brand, model;
+    } cases[] = {
+        {"CLS;MDL:X;MFG:ACME;", "ACME", "keep"},
+        {"CLS;MFG:X;MDL:Y;", "keep", "Y"},
+        {";MDL:X;MODEL:Z;", "keep", "Z"},
+        {"MDL;:X;MFG:A", "A", "keep"},
+        {"MFG:A;B;MDL:C;MODEL:D;", "A", "D"},  // the value ends at its ";": "B;MDL" is the next key
+        {"A;B;C;MFG:;MANUFACTURER:E;", "E", "keep"},
+        {"CLS;MDL:X;", "keep", "keep"},
+        {"X;Y;Z;", "keep", "keep"},
+    };
+    for (const auto &c : cases) EXPECT_EQ(Detect(c.id), std::make_pair(c.brand, c.model)) << c.id;
 }
 
 TEST(ModelDetect, MissingOrEmptyStringIdFailsWithErrExec) {

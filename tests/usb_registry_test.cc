@@ -14,6 +14,7 @@
 #include <string>
 #include <vector>
 
+#include "sandbox/cupsd.h"
 #include "support/fault_sweep.h"
 #include "support/logs.h"
 #include "support/processes.h"
@@ -113,6 +114,7 @@ TEST(UsbPrinterPlugIn, ReplugKeepsOtherKeysAndTakesTheModelFromMdlThenDesThenThe
         {"", kDeviceId, "usbip", "Model 100 Pro"},        {"LPR", kDeviceId, "usbip", "Model 100 Pro"},
         {"custom", kDeviceId, "custom", "Model 100 Pro"}, {"", "DES:Desc;MDL:Real;", "usbip", "Real"},
         {"", "MFG:A;DES:Desc", "usbip", "Desc"},          {"", "mdl:lower;", "usbip", "Model 100"},
+        {"", "CLS;MDL:Inner;", "usbip", "Inner"},  // "MDL:" anywhere, unlike the pair walk
         {"", "", "usbip", "Model 100"},  // logged as a bad parameter
     };
     for (const auto &c : cases) {
@@ -196,6 +198,18 @@ TEST(UsbPrinterPlugIn, HostileDeviceTextsAddNoKeyNoSection) {
     }
 }
 
+// A section name is only text: a serial number that would make a path or a
+// file name pattern still registers the printer (only its kept PPD copy is
+// refused, by the queue creation).
+TEST(UsbPrinterPlugIn, SerialThatWouldMakeAPathOrPatternStillRegisters) {
+    for (const char *szSerial : {"SN*", "SN?1", "SN[0]1", "../../../tmp/x", "a/b"}) {
+        ResetSandbox();
+        Plug("lp0", "1-1", szSerial);
+        EXPECT_EQ(XAVOPrinterEnableExt(1, "lp0", "1-1"), 0) << szSerial;
+        EXPECT_EQ(ReadSection(kConf, std::string("04b8:0005:") + szSerial).at("mode"), "usbip") << szSerial;
+    }
+}
+
 TEST(UsbPrinterPlugIn, TwoProcessesPluggingAtOnceBothGetLineAndSection) {
     Plug("lp0", "1-1", "SN0001");
     Plug("lp1", "1-2", "SN0002");
@@ -250,6 +264,40 @@ TEST(UsbPrinterListing, DeviceNamesIdsAndCountsFollowTheTable) {
     EXPECT_EQ(XAVOPrinterUsbtabEnum(nullptr, &count), -1);
     EXPECT_EQ(XAVOPrinterProcUsbtabIdEnum(nullptr), -1);
     EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
+}
+
+// The USB library keeps serial numbers of up to 127 characters; with vendor
+// and product before it the ID is cut to 127, and a caller that learns the
+// ID from a listing must find the section and get the queue.
+class LongSerialPrinter : public ::testing::Test {
+protected:
+    void TearDown() override { Cupsd::Stop(); }
+};
+
+TEST_F(LongSerialPrinter, IsListedUnderItsSectionsNameAndGetsItsQueue) {
+    std::string serial;
+    for (int i = 0; serial.size() < 127; ++i) serial += std::to_string(i % 10);
+    const std::string id = ("04b8:0005:" + serial).substr(0, 127);
+    Plug("lp0", "1-1", serial);
+    ASSERT_EQ(XAVOPrinterEnableExt(1, "lp0", "1-1"), 0);
+    EXPECT_EQ(ReadSection(kConf, id).at("mode"), "usbip");
+
+    ORLICSzList *list = nullptr;
+    ASSERT_EQ(XAVOPrinterEnumCount(XAVO_PRINTER_TYPE_USB, &list), 1);
+    const std::vector<std::string> listed = Items(list);
+    ORLICSzListFree(list);
+    list = ORLICSzListAlloc(8);
+    ASSERT_EQ(XAVOPrinterProcUsbtabIdEnum(&list), 0);
+    EXPECT_EQ(Items(list), listed);
+    ORLICSzListFree(list);
+    ASSERT_THAT(listed, ElementsAre(id));
+
+    Cupsd::Start();
+    ASSERT_EQ(XAVOPrinterCupsAdd(listed[0].c_str(), nullptr), 0);
+    char szName[64] = {};
+    ASSERT_EQ(XAVOPrinterCupsNameGet(listed[0].c_str(), szName, sizeof szName), 0);
+    EXPECT_STREQ(szName, "usbprinter1");
+    EXPECT_EQ(Queue("usbprinter1").deviceUri, "usb:/dev/usb/" + id);
 }
 
 }  // namespace

@@ -5,10 +5,7 @@
 #include <sys/ioctl.h>
 #include <syslog.h>
 
-#include <cinttypes>
-#include <cstdio>
 #include <cstring>
-#include <string>
 #include <string_view>
 
 #include "conf/conf_paths.h"
@@ -18,6 +15,7 @@
 #include "internal/text.h"
 #include "share/smb_conf.h"
 #include "usb/usb_paths.h"
+#include "usb/usb_printer_id.h"
 #include "usb/usblp.h"
 #include "xavoprinter.h"
 #include "xavousb.h"
@@ -48,9 +46,6 @@ constexpr uint32_t kUsbIdMapLock = ORLIC_LOCK_USBIDMAP;
 constexpr unsigned long kMaxUsblpNumber = 1;
 constexpr char kUsblpPrefix[] = "lp";
 
-// A printer ID is formed in 128 bytes.
-constexpr size_t kPrinterIdSize = 128;
-constexpr char kPrinterIdFormat[] = "%04" PRIx32 ":%04" PRIx32 ":%s";
 // Texts taken from the USB library or the device go into these fields with
 // at most 127 characters.
 constexpr int64_t kDeviceTextSize = 128;
@@ -110,16 +105,6 @@ bool BeyondSupportedPrinters(std::string_view devName) {
 bool FitsTableLine(std::string_view text) {
     for (unsigned char c : text) {
         if (c == '=' || c == '"' || c < 0x20 || c == 0x7f) return false;
-    }
-    return true;
-}
-
-// A printer ID names a section of the printer configuration file; a line
-// break in it (from a device's serial number) would break the section's
-// header line.  Such a device has no usable printer ID.
-bool FitsSectionName(std::string_view id) {
-    for (unsigned char c : id) {
-        if (c < 0x20 || c == 0x7f) return false;
     }
     return true;
 }
@@ -203,15 +188,8 @@ int32_t PrinterUsbConfSetup(const char *szDevName) {
         XLOG(LOG_ERR, kLogDevInfoFailed, ORLICErrGet());
         return -1;
     }
-    char szPrinterId[kPrinterIdSize] = {};
-    const std::string serial(FieldText(info.szSerial));
-    if (!FieldText(info.szPrinterId).empty()) {
-        CopyText(szPrinterId, FieldText(info.szPrinterId));
-    } else if (info.uVendorId != 0 && info.uProductId != 0 && !serial.empty()) {
-        std::snprintf(szPrinterId, sizeof szPrinterId, kPrinterIdFormat, info.uVendorId, info.uProductId,
-                      serial.c_str());
-    }
-    if (szPrinterId[0] == '\0' || !FitsSectionName(szPrinterId)) {
+    char szPrinterId[kUsbPrinterIdSize] = {};
+    if (!UsbPrinterId(info, szPrinterId)) {
         XLOG(LOG_ERR, kLogWrongPrinterId, ORLICErrGet());
         return -1;
     }

@@ -2,13 +2,11 @@
 // USB printer table.
 #include <syslog.h>
 
-#include <string>
-
 #include "internal/boundary.h"
 #include "internal/guards.h"
 #include "internal/log.h"
-#include "internal/text.h"
 #include "usb/usb_paths.h"
+#include "usb/usb_printer_id.h"
 #include "xavoprinter.h"
 #include "xavousb.h"
 
@@ -37,11 +35,13 @@ XAVO_EXPORT int32_t XAVOPrinterProcUsbtabIdEnum(ORLICSzList **ppList) noexcept {
                 XLOG(LOG_ERR, kLogInfoFailed, ppszNames[i]);
                 continue;
             }
-            // Only the USB library's own printer ID is listed; the vendor,
-            // product and serial form belongs to the enable flow.
-            const std::string printerId(xavo::FieldText(info.szPrinterId));
-            if ((info.uKind & xavo::kUsbPrinterKinds) != 0 && !printerId.empty()) {
-                ORLICSzListPush(ppList, printerId.c_str());
+            // Only the USB library's own printer ID is listed (the vendor,
+            // product and serial form belongs to the enable flow), formed
+            // as the enable names the printer's section: a caller that
+            // creates a queue with a listed ID finds the section.
+            char szPrinterId[xavo::kUsbPrinterIdSize] = {};
+            if ((info.uKind & xavo::kUsbPrinterKinds) != 0 && xavo::UsbLibraryPrinterId(info, szPrinterId)) {
+                ORLICSzListPush(ppList, szPrinterId);
             }
         }
         return 0;
