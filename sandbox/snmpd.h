@@ -27,7 +27,8 @@ namespace xavo::test {
 inline constexpr char kSnmpEnterprise[] = ".1.3.6.1.4.1.99999";
 
 // One published value: its OID below the enterprise, an snmpd type
-// ("octet_str", "integer") and the value as snmpd.conf takes it.
+// ("octet_str", "integer") and the value as snmpd.conf takes it (text, or
+// "0x" followed by hex digits).
 struct SnmpValue {
     std::string suffix;  // ".1.1.0"
     std::string type;
@@ -58,7 +59,10 @@ public:
         std::string conf = std::string("view printer included ") + kSnmpEnterprise + "\n" +
                            "rocommunity public default -V printer\n";
         for (const SnmpValue &v : values) {
-            conf += "override " + std::string(kSnmpEnterprise) + v.suffix + " " + v.type + " \"" + v.value + "\"\n";
+            // "0x" and hex digits: any bytes, line breaks included, which a
+            // quoted value of snmpd.conf cannot carry.
+            const std::string value = v.value.starts_with("0x") ? v.value : "\"" + v.value + "\"";
+            conf += "override " + std::string(kSnmpEnterprise) + v.suffix + " " + v.type + " " + value + "\n";
         }
         PlaceFile(dir + "/snmpd.conf", conf);
         std::string confPath = dir + "/snmpd.conf";

@@ -1,0 +1,146 @@
+// The files the library writes, read the way their readers read them (the
+// rules of Samba's parser, which the appliance's platform follows), and
+// checked against what the library was asked to write: every other
+// section, key or line was injected by the text that went in.
+#pragma once
+
+#include <filesystem>
+#include <map>
+#include <set>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "sandbox/sandbox.h"
+
+namespace xavo::test {
+
+using Keys = std::set<std::string>;
+
+inline const Keys kUsbSectionKeys = {"producer", "product name", "mode", "autolock timer", "manuallock timer",
+                                     "enable airprint", "enable google cloud print", "driver", "driver brand",
+                                     "usblp string id", "fit to page", "cups printer name"};
+inline const Keys kNetSectionKeys = {"IP", "cups printer name", "Backend", "QName", "Brand", "Model",
+                                     "enable airprint", "enable google cloud print", "driver brand", "driver",
+                                     "string id", "fit to page"};
+inline const Keys kCloudSectionKeys = {"google account", "google pass", "refresh token"};
+inline const Keys kSmbShareKeys = {"comment", "path", "browseable", "public", "guest ok", "writable", "printable"};
+
+inline constexpr char kPrinterConfFile[] = "/usr/xavo/etc/printer.conf";
+inline constexpr char kNptabFile[] = "/usr/xavo/etc/nptab";
+inline constexpr char kUsbtabFile[] = "/tmp/usbtab";
+inline constexpr char kSmbReservedFile[] = "/etc/samba/smb.reserved.conf";
+
+// What one call sequence may have written: sections of the printer
+// configuration file with their keys, and the keys of the two tables.  The
+// Samba share file may always hold its "printers" share.
+struct Expected {
+    std::map<std::string, const Keys *> sections;
+    Keys nptabKeys, usbtabKeys;
+
+    static Expected Nothing() { return {}; }
+    static Expected Usb(const std::string &id) { return Expected{{{id, &kUsbSectionKeys}}, {}, {"lp0"}}; }
+    static Expected Net(const std::string &id, const std::string &ip) {
+        return Expected{{{id, &kNetSectionKeys}}, {ip}, {}};
+    }
+    static Expected Cloud() { return Expected{{{"Google Cloud Print", &kCloudSectionKeys}}, {}, {}}; }
+};
+
+inline std::string_view TrimBlanks(std::string_view s) {
+    const size_t first = s.find_first_not_of(" \t");
+    if (first == std::string_view::npos) return {};
+    return s.substr(first, s.find_last_not_of(" \t") - first + 1);
+}
+
+inline std::vector<std::string_view> SplitAtNewlines(std::string_view text) {
+    std::vector<std::string_view> lines;
+    for (size_t at = 0; at < text.size();) {
+        size_t end = text.find('\n', at);
+        if (end == std::string_view::npos) end = text.size();
+        lines.push_back(text.substr(at, end - at));
+        at = end + 1;
+    }
+    return lines;
+}
+
+// A line that is neither blank, nor a header, nor "key = value" is one the
+// writers never make; nor is a comment or a carriage return (a reader that
+// splits lines there would see a line of its own).
+inline void CheckLine(std::string_view line, const char *szFile, std::vector<std::string> *pFound) {
+    if (line.find('\r') != std::string_view::npos) pFound->push_back(std::string(szFile) + ": carriage return");
+    if (!line.empty() && (line[0] == '#' || line[0] == ';')) pFound->push_back(std::string(szFile) + ": comment");
+}
+
+inline void CheckSectionFile(const char *szFile, const std::map<std::string, const Keys *> &allowed,
+                             std::vector<std::string> *pFound) {
+    std::set<std::string> sections, keys;
+    const Keys *pKeys = nullptr;
+    const std::string text = ReadFile(szFile);
+    const std::string file = szFile;
+    for (std::string_view raw : SplitAtNewlines(text)) {
+        const std::string_view line = TrimBlanks(raw);
+        CheckLine(line, szFile, pFound);
+        if (line.empty() || line[0] == '#' || line[0] == ';') continue;
+        const size_t close = line.rfind(']');
+        if (line[0] == '[' && close != std::string_view::npos && close > 0) {
+            const std::string name(line.substr(1, close - 1));
+            auto it = allowed.find(name);
+            if (it == allowed.end() || !sections.insert(name).second) pFound->push_back(file + ": section " + name);
+            pKeys = it == allowed.end() ? nullptr : it->second;
+            keys.clear();
+            continue;
+        }
+        const size_t eq = line.find('=');
+        const std::string key(TrimBlanks(line.substr(0, eq)));
+        if (line[0] == '[' || eq == std::string_view::npos) {
+            pFound->push_back(file + ": line " + std::string(line.substr(0, 60)));
+        } else if (pKeys == nullptr || pKeys->count(key) == 0 || !keys.insert(key).second) {
+            pFound->push_back(file + ": key " + key.substr(0, 60));
+        }
+    }
+}
+
+inline void CheckKeyValueFile(const char *szFile, const Keys &allowed, std::vector<std::string> *pFound) {
+    Keys keys;
+    const std::string text = ReadFile(szFile);
+    for (std::string_view raw : SplitAtNewlines(text)) {
+        const std::string_view line = TrimBlanks(raw);
+        CheckLine(line, szFile, pFound);
+        if (line.empty() || line[0] == '#') continue;
+        const size_t eq = line.find('=');
+        const std::string key(TrimBlanks(line.substr(0, eq)));
+        if (eq == std::string_view::npos || allowed.count(key) == 0 || !keys.insert(key).second) {
+            pFound->push_back(std::string(szFile) + ": line " + std::string(line.substr(0, 60)));
+        }
+    }
+}
+
+// The USB/IP status files belong to the sharing service: the library never
+// writes one.
+inline std::vector<std::string> UsbipFiles() {
+    std::vector<std::string> files;
+    for (const auto &entry : std::filesystem::directory_iterator("/tmp")) {
+        const std::string name = entry.path().filename().string();
+        if (name.starts_with("usbip_")) files.push_back(entry.path().string());
+    }
+    return files;
+}
+
+inline std::vector<std::string> Injections(const Expected &expected) {
+    std::vector<std::string> found;
+    CheckSectionFile(kPrinterConfFile, expected.sections, &found);
+    CheckSectionFile(kSmbReservedFile, {{"printers", &kSmbShareKeys}}, &found);
+    CheckKeyValueFile(kNptabFile, expected.nptabKeys, &found);
+    CheckKeyValueFile(kUsbtabFile, expected.usbtabKeys, &found);
+    for (const std::string &path : UsbipFiles()) found.push_back(path + ": written");
+    return found;
+}
+
+inline void ClearWrittenFiles() {
+    for (const char *szFile : {kPrinterConfFile, kNptabFile, kUsbtabFile, kSmbReservedFile}) {
+        std::filesystem::remove(szFile);
+    }
+    for (const std::string &path : UsbipFiles()) std::filesystem::remove(path);
+}
+
+}  // namespace xavo::test
