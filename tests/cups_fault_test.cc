@@ -248,12 +248,14 @@ TEST_F(CupsFaults, PpdCopyIsRefusedForIdsThatCannotNameAKeptCopy) {
     for (const auto &c : cases) {
         SCOPED_TRACE(c.id.substr(0, 40));
         NetPrinterConf conf = NetRecord("10.0.0.5", "of?ice", "socket");
-        EXPECT_EQ(c.bNet ? XAVOPrinterNetCupsAdd(&conf, "/tmp/new.ppd") : XAVOPrinterCupsAdd(c.id.c_str(), "/tmp/new.ppd"),
-                  0);
+        const int32_t result =
+            c.bNet ? XAVOPrinterNetCupsAdd(&conf, "/tmp/new.ppd") : XAVOPrinterCupsAdd(c.id.c_str(), "/tmp/new.ppd");
+        EXPECT_EQ(result, 0);
         EXPECT_THAT(Runs().front(), EndsWith(" -P /tmp/new.ppd"));
         const std::string unit = c.bNet ? "printer_net_cups_add" : "printer_cups_printer_add";
         const std::string refused = "3 printer_backup_ppd:N Invaild Argument (" + c.condition + ")=[0]\n";
-        const std::string failed = "3 " + unit + ":N Failed to backup ppd file: /tmp/new.ppd[0x0D00 printer_backup_ppd:";
+        const std::string failed =
+            "3 " + unit + ":N Failed to backup ppd file: /tmp/new.ppd[0x0D00 printer_backup_ppd:";
         EXPECT_THAT(Logs(), IsSupersetOf<std::vector<Matcher<std::string>>>({Eq(refused), StartsWith(failed)}));
         EXPECT_EQ(PpdFiles(), before);
     }

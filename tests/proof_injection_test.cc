@@ -197,7 +197,8 @@ struct Channel {
 
 std::vector<Channel> Channels(const std::vector<NetPrinterInfo> &mdnsInfo) {
     return {
-        {"usblp device ID", [](size_t, const std::string &p) { return PlugAndEnable({}, "MFG:A" + p + ";MDL:M" + p + ";"); }},
+        {"usblp device ID",
+         [](size_t, const std::string &p) { return PlugAndEnable({}, "MFG:A" + p + ";MDL:M" + p + ";"); }},
         {"sysfs serial", [](size_t, const std::string &p) { return PlugAndEnable({.serial = p}, "MFG:A;MDL:M;"); }},
         {"sysfs manufacturer", [](size_t, const std::string &p) { return PlugAndEnable({.manufacturer = p}, ""); }},
         {"sysfs product", [](size_t, const std::string &p) { return PlugAndEnable({.productName = p}, ""); }},
@@ -206,7 +207,8 @@ std::vector<Channel> Channels(const std::vector<NetPrinterInfo> &mdnsInfo) {
              XAVOPrinterNetInfoGetByIP(SnmpAddress(i).c_str(), &info);
              return Register(info, SnmpAddress(i).c_str());
          }},
-        {"mDNS TXT", [&mdnsInfo](size_t i, const std::string &) { return Register(mdnsInfo[i], MdnsAddress(i).c_str()); }},
+        {"mDNS TXT",
+         [&mdnsInfo](size_t i, const std::string &) { return Register(mdnsInfo[i], MdnsAddress(i).c_str()); }},
         {"BJNP listing", [](size_t, const std::string &p) {
              PlaceFile("/tmp/bjnp.listing", "network bjnp://10.0.0.1:8611 \"Canon " + p + "\" \"Canon " + p +
                                                 " 10.0.0.1\" \"MFG:Canon" + p + ";MDL:M" + p + ";\"\n");
