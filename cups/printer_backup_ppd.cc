@@ -38,7 +38,7 @@ int32_t PrinterBackupPpd(const char *szPpdFile, const char *szPrinterId) {
     // a cut ID is another printer's ID and its copy would be overwritten.
     char szDest[kDestSize] = {};
     if (!XARG_OK(KeptPpdName(szPrinterId), kCondKeptName) ||
-        !XARG_OK(NamePath(szDest, kPpdPathFormat, szPrinterId), kCondDestFits)) {
+        !XARG_OK(NamePath(szDest, kKeptPpd, szPrinterId), kCondDestFits)) {
         return -1;
     }
     if (ORLICExec(kMkdirPath, "-p", kPpdDir, nullptr, nullptr) != 0) {

@@ -19,7 +19,7 @@ XAVO_EXPORT char *XAVOCupsGetPPD(const char *szPpdName) noexcept {
         // is refused rather than cut (cutting ".ppd" off opens the name
         // itself, whatever it points at).
         char szPath[kPathSize] = {};
-        if (szPpdName == nullptr || !xavo::NamePath(szPath, xavo::kPpdPathFormat, szPpdName)) {
+        if (szPpdName == nullptr || !xavo::NamePath(szPath, xavo::kKeptPpd, szPpdName)) {
             XSETERR(ERR_BAD_PARAMETERS);
             return nullptr;
         }

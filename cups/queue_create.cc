@@ -44,7 +44,7 @@ PpdChoice PpdChoose(const char *szPpdFile, const char *szPrinterId, const char *
         // An ID that cannot name a kept copy, or too long for the 512-byte
         // path whole, has none: a cut or redirected path would hand the
         // queue another printer's file.
-        choice.bUse = KeptPpdName(szPrinterId) && NamePath(choice.szPath, kPpdPathFormat, szPrinterId) &&
+        choice.bUse = KeptPpdName(szPrinterId) && NamePath(choice.szPath, kKeptPpd, szPrinterId) &&
                       ::stat(choice.szPath, &st) == 0;
         return choice;
     }

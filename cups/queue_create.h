@@ -8,13 +8,15 @@
 #include <cstdint>
 
 #include "internal/argv.h"
+#include "internal/name_path.h"
 
 namespace xavo {
 
 inline constexpr char kSchedulerService[] = "cupsd";
 inline constexpr char kLpadminPath[] = "/usr/bin/lpadmin";
 inline constexpr char kPpdDir[] = "/etc/cups/ppd/";
-inline constexpr char kPpdPathFormat[] = "/etc/cups/ppd/%s.ppd";
+// A printer's kept PPD copy: "/etc/cups/ppd/" + printer ID + ".ppd".
+inline constexpr NamedFile kKeptPpd{kPpdDir, ".ppd"};
 // The first USB queue and its alias, which is made, switched and removed
 // with it.
 inline constexpr char kFirstUsbQueue[] = "usbprinter1";

@@ -42,7 +42,7 @@ XAVO_EXPORT int32_t XAVOPrinterQueueGet(const char *szPrinterId, char *szBuf, in
         // another file's name.
         char szPath[kPathSize];
         if (!XARG_OK(std::strchr(szPrinterId, '/') == nullptr, kCondNoSlash) ||
-            !XARG_OK(xavo::NamePath(szPath, xavo::kUsbipStatusFormat, szPrinterId), kCondPathFits)) {
+            !XARG_OK(xavo::NamePath(szPath, xavo::kUsbipStatus, szPrinterId), kCondPathFits)) {
             return -1;
         }
 

@@ -24,7 +24,7 @@ XAVO_EXPORT int32_t XAVOPrinterUsbipGetLockStatus(const char *szPrinterId, char 
         // cut into another printer's status file.
         char szPath[kPathSize];
         if (szBuf == nullptr || cbBuf <= 0 || szPrinterId == nullptr ||
-            !xavo::NamePath(szPath, xavo::kUsbipStatusFormat, szPrinterId)) {
+            !xavo::NamePath(szPath, xavo::kUsbipStatus, szPrinterId)) {
             XSETERR(ERR_BAD_PARAMETERS);
             return -1;
         }

@@ -2,10 +2,13 @@
 // queue text reader reach them.
 #pragma once
 
+#include "internal/name_path.h"
+
 namespace xavo {
 
-// One key-value file per shared printer, written only by the service.
-inline constexpr char kUsbipStatusFormat[] = "/tmp/usbip_%s";
+// One key-value file per shared printer, "/tmp/usbip_" + printer ID,
+// written only by the service.
+inline constexpr NamedFile kUsbipStatus{"/tmp/usbip_", ""};
 inline constexpr char kBindDriver[] = "/usr/bin/bind_driver";
 
 }  // namespace xavo
