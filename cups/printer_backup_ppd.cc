@@ -1,6 +1,5 @@
 #include <syslog.h>
 
-#include <cstdio>
 #include <cstring>
 
 #include "cups/queue_create.h"
