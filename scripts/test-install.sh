@@ -50,9 +50,14 @@ check_tree() {
   for lib in "$libdir"/lib*.so.6; do
     if readelf -d "$lib" | grep -qE 'RPATH|RUNPATH'; then fail "$label: $(basename "$lib") carries a run path"; fi
   done
+  # Under DESTDIR pkg-config moves -I and -L into the stage, but not the
+  # linker's -rpath-link for the libraries' own dependencies: given here.
+  local staged=()
+  [ -z "$stage" ] || staged=(-Wl,-rpath-link,"$libdir")
   # shellcheck disable=SC2046
   cc -std=c99 -Wall -Wextra -Wpedantic -Werror -o "$out/caller-pc" "$src/tests/install/caller.c" \
-    $("${pkgconf[@]}" --cflags --libs xavoprinter) || fail "$label: the pkg-config caller does not build"
+    $("${pkgconf[@]}" --cflags --libs xavoprinter) "${staged[@]}" ||
+    fail "$label: the pkg-config caller does not build"
   LD_LIBRARY_PATH=$libdir "$out/caller-pc" >/dev/null || fail "$label: the pkg-config caller fails"
   cmake -S "$src/tests/install" -B "$out/cmake" -G Ninja -DCMAKE_PREFIX_PATH="$root" >/dev/null &&
     cmake --build "$out/cmake" >/dev/null || fail "$label: the CMake package caller does not build"
