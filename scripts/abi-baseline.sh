@@ -36,10 +36,13 @@ check)
         echo "no ABI baseline $baseline: create it with $0 update $lib $baseline" >&2
         exit 1
     fi
-    # abidiff exits non-zero on any change, compatible additions included:
-    # the baseline must describe the library exactly.
-    # shellcheck disable=SC2086
-    if ! abidiff $(echo "$public" | sed 's/--headers-dir/--headers-dir2/g') --no-show-locs "$baseline" "$lib"; then
+    # The baseline holds the public interface only; the library's side is
+    # cut to what its exported functions reach.  (Filtering that side by
+    # headers as well would hide a changed record: the baseline keeps no
+    # locations that tell it public.)  abidiff exits non-zero on any
+    # change, compatible additions included: the baseline describes the
+    # library exactly.
+    if ! abidiff --exported-interfaces-only --no-show-locs "$baseline" "$lib"; then
         echo "libxavoprinter.so.6 differs from $baseline (above). An intended change updates the" >&2
         echo "baselines in the same commit: see $0." >&2
         exit 1
