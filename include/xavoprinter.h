@@ -176,7 +176,7 @@ int32_t XAVOPrinterCupsNameGet(const char *szPrinterId, char *szBuf, int32_t cbB
  * the first place szType occurs in the string, case ignored, to the next
  * ';' or the end.  Returns 0 when found (an empty value counts), -1 when
  * not found (no error code) or with ERR_BAD_PARAMETERS for a null or empty
- * text, a null buffer or cbBuf <= 0. */
+ * szStringId or szType, a null szBuf or cbBuf <= 0. */
 int32_t XAVOPrinterConfStringIdParse(char *szStringId, const char *szType, char *szBuf, int32_t cbBuf) XAVOPRINTER_NOEXCEPT;
 /* The manufacturer: the first of "MANUFACTURER:", "MFG:", "MFR:" found.
  * Returns 0 or -1 as XAVOPrinterConfStringIdParse (a bad argument is
