@@ -62,6 +62,11 @@ static_assert(std::atomic<int>::is_always_lock_free);
 static_assert(std::atomic<std::uint32_t>::is_always_lock_free);
 static_assert(std::atomic<std::uint64_t>::is_always_lock_free,
               "the shared state needs address-free 64-bit atomics");
+// A 32-bit build's programs share the mapping with the host's 64-bit ones
+// (sh, cat) through the preload shim: the layout must not depend on the
+// class, which holds while 64-bit atomics are 8-aligned in both.
+static_assert(alignof(std::atomic<std::uint64_t>) == 8 && sizeof(DeviceSlot) % 8 == 0,
+              "the shared state's layout differs between 32-bit and 64-bit programs");
 
 // The mapping, created by EnterSandbox() or found by path on first use.
 // nullptr outside a sandbox.

@@ -24,7 +24,9 @@ samba-common-bin iproute2 iputils-ping
 cups cups-client cups-bsd
 snmp snmpd
 avahi-daemon avahi-utils dbus
-psmisc procps"
+psmisc procps
+g++-multilib libgtest-dev:i386 libgmock-dev:i386 libsodium-dev:i386
+build-essential debhelper lintian abigail-tools"
 
 missing=""
 for p in $PACKAGES; do
@@ -51,6 +53,11 @@ cleanup() {
 }
 trap cleanup EXIT INT TERM
 
+# The appliance is 32-bit: the i386 build (cmake/i386-linux-gnu.cmake)
+# links Debian's i386 multiarch packages.
+if ! dpkg --print-foreign-architectures | grep -qx i386; then
+    dpkg --add-architecture i386
+fi
 apt-get update -qq
 # shellcheck disable=SC2086
 apt-get install -y -qq --no-install-recommends \

@@ -4,6 +4,9 @@
 # Run as root on Debian 12: it installs what it needs with apt-get, and the
 # tests enter private mount and network namespaces (they never touch the
 # host's files or network).
+# Then the suite once more for the appliance's 32-bit target (test-i386.sh),
+# and the install trees and Debian packages as an integrator uses them
+# (test-install.sh).
 set -euo pipefail
 cd "$(dirname "$0")/.."
 
@@ -30,4 +33,6 @@ for variant in plain asan; do
     status=1
   fi
 done
+bash scripts/test-i386.sh || status=1
+bash scripts/test-install.sh || status=1
 exit $status

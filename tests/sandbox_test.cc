@@ -176,8 +176,9 @@ TEST(SimulatedUsblp, RequestsAnswerAsTheDriverDoes) {
 TEST(SimulatedUsblp, PreloadedShimServesExecutedPrograms) {
     xt::SetUsblp("lp0", {.busyOpens = 1});
     // The shell's own open() of a redirection: busy first, then opened.
-    const std::string shell = std::string("LD_PRELOAD=") + XAVO_USBLP_PRELOAD +
-                              " /bin/sh -c 'cat </dev/usb/lp0 || cat </dev/usb/lp0' 2>/dev/null";
+    // Quoted: the path holds ld.so's own "$LIB", not the shell's.
+    const std::string shell = std::string("LD_PRELOAD='") + XAVO_USBLP_PRELOAD +
+                              "' /bin/sh -c 'cat </dev/usb/lp0 || cat </dev/usb/lp0' 2>/dev/null";
     EXPECT_EQ(Shell(shell), 0);
     EXPECT_EQ(xt::GetUsblp("lp0").opens, 2);
 }
