@@ -44,7 +44,9 @@ int CloudGet(const Registry &reg, bool bReveal) {
     WipedInfo w;
     ResetPlatformError();
     if (XAVOPrinterGoogleInfoGet(&w.info) != 0) {
-        if (w.info.szAccount[0] == '\0') return r.Fail("no cloud print account is stored");
+        // The library sets no code of its own for a missing account; one
+        // left by its read of a missing file would only mislead.
+        if (w.info.szAccount[0] == '\0') return r.FailWithoutCode("no cloud print account is stored");
         r.Set("account", w.info.szAccount);
         return r.Fail(std::string("the cloud print account ") + w.info.szAccount +
                       " has no readable password or refresh token");
