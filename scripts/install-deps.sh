@@ -24,7 +24,8 @@ samba-common-bin iproute2 iputils-ping
 cups cups-client cups-bsd
 snmp snmpd
 avahi-daemon avahi-utils dbus
-psmisc procps"
+psmisc procps
+libcli11-dev nlohmann-json3-dev python3"
 
 missing=""
 for p in $PACKAGES; do

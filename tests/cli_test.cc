@@ -16,6 +16,7 @@
 #include <thread>
 #include <vector>
 
+#include "sandbox/cupsd.h"
 #include "sandbox/sandbox.h"
 #include "support/cli_run.h"
 
@@ -98,6 +99,27 @@ TEST(Cli, GroupsListTheirSubcommandsAndEveryLeafHasAnExample) {
         }
     }
     EXPECT_THAT(Cli({"job", "wait", "--help"}).out, HasSubstr("header lines"));
+}
+
+// What the bash completion offers after the given words (the last one is
+// the word being completed).
+std::string Completions(const std::string &words) {
+    PlaceFile("/tmp/complete.sh", std::string("source ") + XAVO_COMPLETION + "\nCOMP_WORDS=(" XAVO_CLI_PATH " " + words +
+                                      ")\nCOMP_CWORD=$((${#COMP_WORDS[@]} - 1))\n_xavoprinter\necho \"${COMPREPLY[*]}\"\n");
+    return Tool({"/bin/bash", "--norc", "/tmp/complete.sh"});
+}
+
+TEST(Cli, BashCompletionOffersSubcommandsOptionsAndDevices) {
+    const struct {
+        std::string words, offered;
+    } cases[] = {
+        {"''", "list show usb net queue print job spool share cloud usbip --help --version\n"},
+        {"usb ''", "enable disable devid reset\n"},
+        {"usb enable ''", "lp0 lp1\n"},
+        {"job wait id job --t", "--timeout\n"},
+        {"net add 192.0.2.1 office --backend ''", "socket lpd ipp bjnp\n"},
+    };
+    for (const auto &c : cases) EXPECT_EQ(Completions(c.words), c.offered) << c.words;
 }
 
 TEST(Cli, VersionIsTheProjectVersion) {
