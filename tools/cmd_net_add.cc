@@ -88,18 +88,72 @@ NetPrinterConf ConfFrom(const AddArgs &a) {
     return conf;
 }
 
+// Who uses the address or the name, in words; "" when nobody else.
+std::string InUse(const Conflicts &c, const AddArgs &a) {
+    std::vector<std::string> users = c.printers;
+    if (c.bForeignQueueAtAddress) users.push_back("a CUPS queue printing to " + a.ip);
+    if (c.bQueueNameElsewhere) users.push_back("the CUPS queue " + a.name + " of another device");
+    std::string text;
+    for (const std::string &u : users) text += (text.empty() ? "" : ", ") + u;
+    return text;
+}
+
+// Takes back what this run made after a failed step: the queue (when it
+// was tried and did not exist before) and the table line (when it did not
+// exist before).  Fills "undone" and "remains".
+void TakeBack(Report &r, const AddArgs &a, const NetPrinterConf &conf, const Conflicts &c, bool bHadSection,
+              bool bQueueTried) {
+    Json undone = Json::array();
+    Json remains = Json::array();
+    const auto take = [&](bool bDone, const std::string &what) { (bDone ? undone : remains).push_back(what); };
+    if (bQueueTried && !c.bOwnQueue && XAVOPrinterNetCupsNameAndIPCheck(a.ip.c_str(), a.name.c_str()) == 1) {
+        take(XAVOPrinterNetCupsRm(conf.szPrinterId) == 0, "CUPS queue " + a.name);
+    }
+    if (!c.bOwnLine) take(XAVOPrinterNetUpdateConf(0, &conf) == 0, "network printer table line " + a.ip);
+    if (!bHadSection) {
+        remains.push_back("section [" + std::string(conf.szPrinterId) + "] of " + kPrinterConf +
+                          " (the library never removes one)");
+    }
+    r.Set("undone", undone);
+    r.Set("remains", remains);
+}
+
+// The library's three steps, taken back as far as possible when one fails.
+int Register(Report &r, const AddArgs &a, const NetPrinterConf &conf, const Conflicts &c) {
+    const bool bHadSection = SectionExists(conf.szPrinterId);
+    Progress("writing the printer's section...");
+    ResetPlatformError();
+    if (XAVOPrinterNetConfSetup(&conf, 0) != 0) return r.Fail("could not write the printer's section");
+    Progress("adding the network printer table line and the printers share...");
+    ResetPlatformError();
+    if (XAVOPrinterNetUpdateConf(1, &conf) != 0) {
+        const uint32_t uCode = ORLICErrGet();
+        TakeBack(r, a, conf, c, bHadSection, false);
+        return r.Fail("could not add the network printer table line or the printers share", uCode);
+    }
+    Progress("creating the CUPS queue...");
+    ResetPlatformError();
+    const int32_t made = XAVOPrinterNetCupsAdd(&conf, a.ppd.empty() ? nullptr : a.ppd.c_str());
+    const uint32_t uCode = ORLICErrGet();
+    if (made != 0 || XAVOPrinterNetCupsNameAndIPCheck(a.ip.c_str(), a.name.c_str()) != 1) {
+        TakeBack(r, a, conf, c, bHadSection, true);
+        return r.Fail(made != 0 ? "could not create the CUPS queue " + a.name
+                                : "CUPS has no queue " + a.name + " for " + a.ip + " afterwards",
+                      uCode);
+    }
+    r.Set("undone", Json::array());
+    r.Set("remains", Json::array());
+    r.Set("device_uri", std::string(conf.szBackend) + "://" + conf.szIP + "/" + conf.szQName);
+    return r.Succeed();
+}
+
 int Add(const Registry &reg, const AddArgs &a) {
     Report r(reg.bJson, {"printer_id", "cups_queue", "device_uri", "replaced", "undone", "remains"});
     const NetPrinterConf conf = ConfFrom(a);
-    const std::string id = conf.szPrinterId;
-    r.Set("printer_id", id);
+    r.Set("printer_id", conf.szPrinterId);
     r.Set("cups_queue", a.name);
-    const Conflicts c = FindConflicts(a.ip, a.name, id);
-    if (!a.bReplace && (!c.printers.empty() || c.bForeignQueueAtAddress || c.bQueueNameElsewhere)) {
-        std::string users;
-        for (const std::string &p : c.printers) users += (users.empty() ? "" : ", ") + p;
-        if (c.bForeignQueueAtAddress) users += std::string(users.empty() ? "" : ", ") + "a CUPS queue printing to " + a.ip;
-        if (c.bQueueNameElsewhere) users += std::string(users.empty() ? "" : ", ") + "the CUPS queue " + a.name + " of another device";
+    const Conflicts c = FindConflicts(a.ip, a.name, conf.szPrinterId);
+    if (const std::string users = InUse(c, a); !users.empty() && !a.bReplace) {
         return r.FailWithoutCode("the address or the queue name is already in use (" + users +
                                  "); nothing was changed; --replace takes them away first");
     }
@@ -111,50 +165,7 @@ int Add(const Registry &reg, const AddArgs &a) {
     }
     r.Set("replaced", replaced);
     if (c.bForeignQueueAtAddress) r.Note("another CUPS queue, not the appliance's, also prints to " + a.ip);
-
-    const bool bHadSection = SectionExists(id);
-    Json undone = Json::array();
-    Json remains = Json::array();
-    const auto undo = [&](bool bQueueMade, const std::string &sentence) {
-        if (bQueueMade && !c.bOwnQueue && XAVOPrinterNetCupsNameAndIPCheck(a.ip.c_str(), a.name.c_str()) == 1) {
-            if (XAVOPrinterNetCupsRm(id.c_str()) == 0) undone.push_back("CUPS queue " + a.name);
-            else remains.push_back("CUPS queue " + a.name);
-        }
-        if (!c.bOwnLine) {
-            if (XAVOPrinterNetUpdateConf(0, &conf) == 0) undone.push_back("network printer table line " + a.ip);
-            else remains.push_back("network printer table line " + a.ip);
-        }
-        if (!bHadSection) remains.push_back("section [" + id + "] of " + kPrinterConf + " (the library never removes one)");
-        r.Set("undone", undone);
-        r.Set("remains", remains);
-        return sentence;
-    };
-
-    Progress("writing the printer's section...");
-    ResetPlatformError();
-    if (XAVOPrinterNetConfSetup(&conf, 0) != 0) return r.Fail("could not write the printer's section");
-    Progress("adding the network printer table line and the printers share...");
-    ResetPlatformError();
-    if (XAVOPrinterNetUpdateConf(1, &conf) != 0) {
-        const uint32_t code = ORLICErrGet();
-        const std::string why = undo(false, "could not add the network printer table line or the printers share");
-        ORLICErrSetEx(code, "", 0);
-        return r.Fail(why);
-    }
-    Progress("creating the CUPS queue...");
-    ResetPlatformError();
-    const int32_t made = XAVOPrinterNetCupsAdd(&conf, a.ppd.empty() ? nullptr : a.ppd.c_str());
-    const uint32_t code = ORLICErrGet();
-    if (made != 0 || XAVOPrinterNetCupsNameAndIPCheck(a.ip.c_str(), a.name.c_str()) != 1) {
-        const std::string why = undo(true, made != 0 ? "could not create the CUPS queue " + a.name
-                                                     : "CUPS has no queue " + a.name + " for " + a.ip + " afterwards");
-        ORLICErrSetEx(code, "", 0);
-        return r.Fail(why);
-    }
-    r.Set("undone", undone);
-    r.Set("remains", remains);
-    r.Set("device_uri", std::string(conf.szBackend) + "://" + conf.szIP + "/" + conf.szQName);
-    return r.Succeed();
+    return Register(r, a, conf, c);
 }
 
 }  // namespace

@@ -127,8 +127,9 @@ void Report::Note(const std::string &line) { notes_.push_back(line); }
 
 int Report::Succeed() { return Finish(true, nullptr); }
 
-int Report::Fail(const std::string &sentence) {
-    const std::uint32_t uCode = ORLICErrGet();
+int Report::Fail(const std::string &sentence) { return Fail(sentence, ORLICErrGet()); }
+
+int Report::Fail(const std::string &sentence, std::uint32_t uCode) {
     if (uCode == 0) return FailWithoutCode(sentence);
     const std::string name = ErrorName(uCode);
     return Finish(false, Json{{"code", uCode}, {"name", name.empty() ? Json(nullptr) : Json(name)},

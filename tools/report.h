@@ -53,6 +53,8 @@ public:
     // command itself (nothing matched), where a left-over code would
     // mislead.
     int Fail(const std::string &sentence);
+    // The same with a code read before later calls could change it.
+    int Fail(const std::string &sentence, std::uint32_t uCode);
     int FailWithoutCode(const std::string &sentence);
 
     bool json() const { return json_; }
