@@ -18,13 +18,20 @@ std::vector<std::string> HashKeys(const ORLICSzHash *hash) {
     return r < 0 ? std::vector<std::string>{} : Items(keys.get());
 }
 
-std::vector<std::string> UsbPrinterIds() {
+namespace {
+
+// The items a library listing appends to a fresh list; none when it fails.
+std::vector<std::string> Listed(int32_t (*list)(ORLICSzList **)) {
     ORLICSzList *raw = ORLICSzListAlloc(8);
     if (raw == nullptr) return {};
-    const int32_t r = XAVOPrinterProcUsbtabIdEnum(&raw);
-    OwnedList ids(raw);
-    return r < 0 ? std::vector<std::string>{} : Items(ids.get());
+    const int32_t r = list(&raw);
+    OwnedList owned(raw);
+    return r < 0 ? std::vector<std::string>{} : Items(owned.get());
 }
+
+}  // namespace
+
+std::vector<std::string> UsbPrinterIds() { return Listed(XAVOPrinterProcUsbtabIdEnum); }
 
 std::vector<std::string> UsbtabDevices() {
     char **ppszNames = nullptr;
@@ -37,12 +44,6 @@ std::vector<std::string> UsbtabDevices() {
     return out;
 }
 
-std::vector<std::string> NetPrinterIds() {
-    ORLICSzList *raw = ORLICSzListAlloc(8);
-    if (raw == nullptr) return {};
-    const int32_t r = XAVOPrinterNetNptabEnum(&raw);
-    OwnedList ids(raw);
-    return r < 0 ? std::vector<std::string>{} : Items(ids.get());
-}
+std::vector<std::string> NetPrinterIds() { return Listed(XAVOPrinterNetNptabEnum); }
 
 }  // namespace cli
