@@ -124,10 +124,13 @@ int SpoolClean(const Registry &reg) {
         r.Set("cleaned", false);
         return r.Fail("could not empty the spool directory");
     }
-    const auto jobs = AskJobs("", reg.bVerbose);
+    // lpq -a lists nothing, and succeeds, when it cannot reach the
+    // scheduler: ask first whether there is one to reach.
+    const auto jobs = AskQueues(reg.bVerbose) ? AskJobs("", reg.bVerbose) : std::nullopt;
     if (!jobs) {
         r.Set("cleaned", false);
-        return r.FailWithoutCode("the spool directory was emptied, but lpq could not tell whether jobs are left");
+        return r.FailWithoutCode("the spool directory was emptied, but CUPS could not be asked whether jobs are "
+                                 "left (is cupsd running?)");
     }
     r.Set("jobs_left", jobs->size());
     r.Set("cleaned", jobs->empty());

@@ -1,9 +1,12 @@
 // queue add, enable, disable, remove, ppd, check, purge-usb: the printers'
 // CUPS queues.  After every change CUPS is asked what it now holds.
+#include <unistd.h>
+
 #include <algorithm>
 #include <cstdio>
 #include <cstdlib>
 #include <memory>
+#include <sstream>
 
 #include "checks.h"
 #include "commands.h"
@@ -81,9 +84,14 @@ int Ppd(const Registry &reg, const std::string &id) {
     std::unique_ptr<char, decltype(&std::free)> text(XAVOCupsGetPPD(id.c_str()), &std::free);
     if (!text) return r.Fail("no PPD file is kept for " + id);
     if (!reg.bJson) {
-        // The file itself, as cat would show it: it is the PPD the user
-        // asked for, not printer-supplied text inside a report.
-        std::fputs(text.get(), stdout);
+        // The file itself, as cat would show it; on a terminal with its
+        // control characters made harmless, line by line.
+        if (isatty(STDOUT_FILENO) != 1) {
+            std::fputs(text.get(), stdout);
+            return 0;
+        }
+        std::istringstream lines(text.get());
+        for (std::string line; std::getline(lines, line);) std::printf("%s\n", SafeText(line).c_str());
         return 0;
     }
     r.Set("ppd", text.get());

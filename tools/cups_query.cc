@@ -54,7 +54,8 @@ std::vector<std::string> ClientEnvironment() {
 }
 
 // Runs a CUPS client and returns its standard output, or nullopt when it
-// could not be started or did not finish in time.  Its complaints on
+// could not be started or did not finish in time.  Its exit status says
+// little: lpstat and lpq fail when CUPS has no queue at all.  Its complaints on
 // standard error reach the terminal only with -v.
 std::optional<std::string> Run(const std::vector<std::string> &args, bool bVerbose) {
     int aiPipe[2];
