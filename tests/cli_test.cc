@@ -5,6 +5,7 @@
 // inside the test's sandbox.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <poll.h>
 #include <pty.h>
 #include <signal.h>
 #include <sys/wait.h>
@@ -231,6 +232,24 @@ TEST(Cli, PromptGivesTheTerminalBackOnCtrlCAndSigterm) {
         close(p.master);
     }
     EXPECT_FALSE(FileExists(kPrinterConf));
+
+    // Typed and entered: stored, echo back on, nothing of it echoed.
+    Prompt p = StartAtPrompt();
+    ASSERT_GT(p.pid, 0);
+    for (int i = 0; i < 500 && EchoOn(p.master); ++i) std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    ASSERT_EQ(write(p.master, "typed-secret\n", 13), 13);
+    std::string shown;
+    char buf[256];
+    pollfd pfd{p.master, POLLIN, 0};
+    for (ssize_t n; poll(&pfd, 1, 10000) == 1 && (n = read(p.master, buf, sizeof buf)) > 0;) {
+        shown.append(buf, static_cast<size_t>(n));
+    }
+    int status = 0;
+    ASSERT_EQ(waitpid(p.pid, &status, 0), p.pid);
+    EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << shown;
+    EXPECT_THAT(shown, AllOf(HasSubstr("password: "), Not(HasSubstr("typed-secret"))));
+    close(p.master);
+    EXPECT_EQ(nlohmann::json::parse(Cli({"cloud", "get", "--reveal", "--json"}).out)["secret"], "typed-secret");
 }
 
 TEST(Cli, PrinterSuppliedBytesGiveValidJsonAndHarmlessText) {
