@@ -26,7 +26,8 @@ snmp snmpd
 avahi-daemon avahi-utils dbus
 psmisc procps
 g++-multilib libgtest-dev:i386 libgmock-dev:i386 libsodium-dev:i386
-build-essential debhelper lintian abigail-tools"
+build-essential debhelper lintian abigail-tools
+libcli11-dev nlohmann-json3-dev python3"
 
 missing=""
 for p in $PACKAGES; do

@@ -1,115 +1,267 @@
-// The xavoprinter command: exit statuses, --json shapes, help, and the
-// refusal of secrets on the command line.  The command runs as a child
-// process inside the test's sandbox, as an appliance service would run it.
+// The xavoprinter command without a scheduler: usage errors caught before
+// anything runs, help at every level, errors in words, secrets refused
+// before they are stored, the terminal given back, text and JSON safe
+// whatever bytes a printer supplied.  The command runs as a child process
+// inside the test's sandbox.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <poll.h>
+#include <pty.h>
+#include <signal.h>
 #include <sys/wait.h>
+#include <termios.h>
 #include <unistd.h>
 
-#include <array>
-#include <cstdio>
-#include <sstream>
+#include <chrono>
 #include <string>
+#include <thread>
+#include <vector>
 
+#include "sandbox/cupsd.h"
 #include "sandbox/sandbox.h"
+#include "support/cli_run.h"
 
+using ::testing::AllOf;
 using ::testing::HasSubstr;
-using ::testing::StartsWith;
+using ::testing::Not;
+using namespace xavo::test;
 
 namespace {
 
-struct CliRun { int status; std::string out, err; };
+constexpr char kPrinterConf[] = "/usr/xavo/etc/printer.conf";
 
-// Runs the command with the given arguments and standard input.
-CliRun Cli(const std::vector<std::string> &args, const std::string &input = "") {
-    xavo::test::PlaceFile("/tmp/cli.in", input);
-    std::string cmd = XAVO_CLI_PATH;
-    for (const std::string &a : args) {
-        std::string quoted = "'";
-        for (char c : a) quoted += c == '\'' ? std::string("'\\''") : std::string(1, c);
-        cmd += " " + quoted + "'";
+TEST(Cli, UsageErrorsExitTwoBeforeAnythingRuns) {
+    const std::vector<std::vector<std::string>> cases = {
+        {},
+        {"frobnicate"},
+        {"usb"},                                        // a group without its subcommand
+        {"usb", "enable", "lp0"},                       // missing BUS
+        {"usb", "disable"},                             // neither DEV nor --bus
+        {"print", "id", "/etc/hostname", "--bogus"},    // unknown option
+        {"print", "id"},                                // missing FILE
+        {"print", "id", "/no/such/file"},
+        {"job", "wait", "id", "j", "--timeout", "abc"},
+        {"job", "wait", "id", "j", "--timeout", "30s"},
+        {"job", "wait", "id", "j", "--timeout", "-5"},
+        {"job", "wait", "id", "j", "--timeout", "0"},
+        {"net", "add", "999.1.1.1", "office"},
+        {"net", "add", "not-an-ip", "office"},
+        {"net", "add", "127.0.0.7", "my printer"},
+        {"net", "add", "127.0.0.7", "a/b"},
+        {"net", "add", "127.0.0.7", std::string(128, 'q')},
+        {"net", "add", "127.0.0.7", "office", "--backend", "carrier-pigeon"},
+        {"net", "ping", "127.1"},
+        {"usbip", "eject", ""},
+        {"show", std::string(128, 'x')},
+        {"cloud", "set", ""},
+        {"cloud", "set", std::string(255, 'a')},
+    };
+    for (const auto &args : cases) {
+        CliRun r = Cli(args);
+        EXPECT_EQ(r.status, 2) << ::testing::PrintToString(args) << "\n" << r.out << r.err;
+        EXPECT_EQ(r.out, "") << ::testing::PrintToString(args);
     }
-    cmd += " </tmp/cli.in 2>/tmp/cli.err";
-    CliRun run{};
-    FILE *p = popen(cmd.c_str(), "r");
-    std::array<char, 4096> buf{};
-    size_t n;
-    while ((n = fread(buf.data(), 1, buf.size(), p)) > 0) run.out.append(buf.data(), n);
-    int st = pclose(p);
-    run.status = WIFEXITED(st) ? WEXITSTATUS(st) : -1;
-    run.err = xavo::test::ReadFile("/tmp/cli.err");
-    return run;
+    EXPECT_FALSE(FileExists(kPrinterConf));
+    EXPECT_FALSE(FileExists("/usr/xavo/etc/nptab"));
 }
 
-TEST(Cli, ExitStatusesTellSuccessFailureAndUsage) {
-    struct { std::vector<std::string> args; int status; } const cases[] = {
-        {{}, 2},
-        {{"frobnicate"}, 2},
-        {{"usb", "enable", "lp0"}, 2},                // missing BUS
-        {{"print", "id", "file", "--bogus"}, 2},      // unknown option
-        {{"share", "status"}, 0},
-        {{"show", "no-such-printer"}, 1},
+TEST(Cli, GroupsListTheirSubcommandsAndEveryLeafHasAnExample) {
+    const struct {
+        std::string group;
+        std::vector<std::string> subcommands;
+    } groups[] = {
+        {"usb", {"enable", "disable", "devid", "reset"}},
+        {"net", {"probe", "add", "remove", "ping", "check"}},
+        {"queue", {"add", "enable", "disable", "remove", "ppd", "check", "purge-usb"}},
+        {"print", {"test-page"}},
+        {"job", {"wait"}},
+        {"spool", {"clean"}},
+        {"share", {"status"}},
+        {"cloud", {"get", "set"}},
+        {"usbip", {"eject", "release", "lock-status"}},
+    };
+    const CliRun top = Cli({"--help"});
+    EXPECT_EQ(top.status, 0);
+    for (const auto &g : groups) {
+        EXPECT_THAT(top.out, HasSubstr("  " + g.group + " ")) << g.group;
+        const CliRun help = Cli({g.group, "--help"});
+        EXPECT_EQ(help.status, 0) << g.group;
+        EXPECT_THAT(help.out, HasSubstr("Usage: xavoprinter " + g.group)) << g.group;
+        const CliRun bare = Cli({g.group});
+        for (const std::string &sub : g.subcommands) {
+            EXPECT_THAT(help.out, HasSubstr("  " + sub + " ")) << g.group << " " << sub;
+            if (g.group != "print") {
+                EXPECT_THAT(bare.err, HasSubstr("  " + sub + " ")) << g.group << " " << sub;
+            }
+            const CliRun leaf = Cli({g.group, sub, "--help"});
+            EXPECT_EQ(leaf.status, 0) << g.group << " " << sub;
+            EXPECT_THAT(leaf.out, AllOf(HasSubstr("Usage: xavoprinter " + g.group + " " + sub), HasSubstr("Example:\n  ")))
+                << g.group << " " << sub;
+        }
+    }
+    EXPECT_THAT(Cli({"job", "wait", "--help"}).out, HasSubstr("header lines"));
+}
+
+// What the bash completion offers after the given words (the last one is
+// the word being completed).
+std::string Completions(const std::string &words) {
+    PlaceFile("/tmp/complete.sh", std::string("source ") + XAVO_COMPLETION + "\nCOMP_WORDS=(" XAVO_CLI_PATH " " + words +
+                                      ")\nCOMP_CWORD=$((${#COMP_WORDS[@]} - 1))\n_xavoprinter\necho \"${COMPREPLY[*]}\"\n");
+    return Tool({"/bin/bash", "--norc", "/tmp/complete.sh"});
+}
+
+TEST(Cli, BashCompletionOffersSubcommandsOptionsAndDevices) {
+    const struct {
+        std::string words, offered;
+    } cases[] = {
+        {"''", "list show usb net queue print job spool share cloud usbip --help --version\n"},
+        {"usb ''", "enable disable devid reset\n"},
+        {"usb enable ''", "lp0 lp1\n"},
+        {"job wait id job --t", "--timeout\n"},
+        {"net add 192.0.2.1 office --backend ''", "socket lpd ipp bjnp\n"},
+    };
+    for (const auto &c : cases) EXPECT_EQ(Completions(c.words), c.offered) << c.words;
+}
+
+TEST(Cli, VersionIsTheProjectVersion) {
+    const CliRun r = Cli({"--version"});
+    EXPECT_EQ(r.status, 0);
+    EXPECT_EQ(r.out, std::string("xavoprinter ") + XAVO_VERSION + "\n");
+}
+
+TEST(Cli, FailuresAreSentencesWithTheCodeOnlyWhereThereIsOne) {
+    const struct {
+        std::vector<std::string> args;
+        std::string says;
+    } cases[] = {
+        {{"usb", "devid", "lp1"}, "xavoprinter: no usblp device lp1 (not present)\n"},
+        {{"cloud", "get"}, "xavoprinter: no cloud print account is stored\n"},
+        {{"usb", "enable", "lp7", "1-1"}, "xavoprinter: lp7 was not registered: the appliance supports lp0 and lp1 only\n"},
+        {{"usb", "disable", "lp1"}, "xavoprinter: nothing to forget: no line for lp1 in /tmp/usbtab\n"},
+        {{"show", "no-such-printer"}, "xavoprinter: no printer no-such-printer in /usr/xavo/etc/printer.conf\n"},
+        {{"usbip", "eject", "04b8:0005:X"}, "xavoprinter: bind_driver could not eject 04b8:0005:X (0x2A00 ERR_EXEC)\n"},
     };
     for (const auto &c : cases) {
-        CliRun r = Cli(c.args);
-        EXPECT_EQ(r.status, c.status) << ::testing::PrintToString(c.args) << "\n" << r.out << r.err;
+        const CliRun r = Cli(c.args);
+        EXPECT_EQ(r.status, 1) << ::testing::PrintToString(c.args);
+        EXPECT_EQ(r.err, c.says) << ::testing::PrintToString(c.args);
     }
+    EXPECT_FALSE(FileExists("/tmp/usbtab") && ReadFile("/tmp/usbtab").find("lp7") != std::string::npos);
 }
 
-TEST(Cli, FailureNamesThePlatformErrorCode) {
-    CliRun r = Cli({"usbip", "eject", ""});
-    EXPECT_EQ(r.status, 1);
-    EXPECT_THAT(r.err, HasSubstr("XAVOPrinterUsbipEject failed: 0x0D00 ERR_BAD_PARAMETERS"));
-    CliRun j = Cli({"usbip", "eject", "", "--json"});
-    EXPECT_EQ(j.status, 1);
-    EXPECT_EQ(j.out, "{\"ok\":false,\"error\":\"XAVOPrinterUsbipEject failed: 0x0D00 ERR_BAD_PARAMETERS\"}\n");
+TEST(Cli, VerboseCopiesTheLibrarysSyslogLinesToStandardError) {
+    EXPECT_THAT(Cli({"usb", "devid", "lp1"}).err, Not(HasSubstr("printer_get_string_id:")));
+    EXPECT_THAT(Cli({"usb", "devid", "lp1", "-v"}).err, HasSubstr("printer_get_string_id:"));
 }
 
-TEST(Cli, JsonIsOneObjectPerRun) {
-    CliRun r = Cli({"usbip", "lock-status", "04b8:0005:X", "--json"});
-    EXPECT_EQ(r.status, 0);
-    EXPECT_EQ(r.out, "{\"printer_id\":\"04b8:0005:X\",\"lock\":\"Free\"}\n");
-    CliRun list = Cli({"list", "--json"});
-    EXPECT_EQ(list.status, 0);
-    EXPECT_EQ(list.out, "{\"count\":0,\"printers\":[]}\n");
-}
-
-TEST(Cli, EverySubcommandHasHelpWithAnExample) {
-    CliRun top = Cli({"--help"});
-    for (const char *path : {"list", "show", "usb enable", "usb disable", "usb devid", "usb reset", "net probe",
-                             "net add", "net remove", "net ping", "net check", "queue add", "queue enable",
-                             "queue disable", "queue remove", "queue ppd", "queue purge-usb", "print",
-                             "print test-page", "job wait", "spool clean", "share status", "cloud get",
-                             "cloud set", "usbip eject", "usbip lock-status", "usbip release"}) {
-        EXPECT_THAT(top.out, HasSubstr(std::string("  ") + path)) << path;
-        std::vector<std::string> args;
-        std::istringstream words(path);
-        for (std::string w; words >> w;) args.push_back(w);
-        args.push_back("--help");
-        CliRun r = Cli(args);
-        EXPECT_EQ(r.status, 0) << path;
-        EXPECT_THAT(r.out, StartsWith("usage: xavoprinter " + std::string(path))) << path;
-        EXPECT_THAT(r.out, HasSubstr("\nexample:\n  ")) << path;
-    }
-}
-
-TEST(Cli, SecretsAreRefusedOnTheCommandLine) {
+TEST(Cli, SecretsNeverComeFromTheCommandLine) {
     for (const char *bad : {"--password", "--password=hunter2", "--refresh-token", "--secret=x"}) {
-        CliRun r = Cli({"cloud", "set", "user@example.com", bad, "hunter2"});
+        const CliRun r = Cli({"cloud", "set", "user@example.com", bad, "hunter2"});
         EXPECT_EQ(r.status, 2) << bad;
         EXPECT_THAT(r.err, HasSubstr("standard input")) << bad;
     }
-    EXPECT_FALSE(xavo::test::FileExists("/usr/xavo/etc/printer.conf"));
+    EXPECT_FALSE(FileExists(kPrinterConf));
 }
 
-TEST(Cli, CloudSecretComesFromStandardInputAndStaysOutOfTheFile) {
-    CliRun set = Cli({"cloud", "set", "user@example.com", "--token"}, "tok-12345-secret\n");
-    ASSERT_EQ(set.status, 0) << set.err;
-    EXPECT_EQ(xavo::test::ReadFile("/usr/xavo/etc/printer.conf").find("tok-12345-secret"), std::string::npos);
-    CliRun get = Cli({"cloud", "get", "--json"});
-    EXPECT_EQ(get.out, "{\"account\":\"user@example.com\",\"secret_in_force\":\"refresh token\"}\n");
-    CliRun reveal = Cli({"cloud", "get", "--reveal", "--json"});
-    EXPECT_THAT(reveal.out, HasSubstr("\"secret\":\"tok-12345-secret\""));
+TEST(Cli, SecretsThatWouldBeStoredEmptyOrCutAreRefusedBeforeAnythingIsWritten) {
+    const struct {
+        std::vector<std::string> args;
+        std::string input;
+        bool bStored;
+    } cases[] = {
+        {{"cloud", "set", "u@example.com"}, "", false},
+        {{"cloud", "set", "u@example.com"}, "\n", false},
+        {{"cloud", "set", "u@example.com"}, std::string(200, 'p') + "\n", false},
+        {{"cloud", "set", "u@example.com"}, std::string(128, 'p') + "\n", false},
+        {{"cloud", "set", "u@example.com"}, std::string("pa\0ss\n", 6), false},
+        {{"cloud", "set", "u@example.com", "--token"}, std::string(256, 't') + "\n", false},
+        {{"cloud", "set", "u@example.com"}, std::string(127, 'p') + "\n", true},
+        {{"cloud", "set", "u@example.com", "--token"}, std::string(255, 't') + "\r\n", true},
+    };
+    for (const auto &c : cases) {
+        ResetSandbox();
+        const CliRun set = Cli(c.args, c.input);
+        EXPECT_EQ(set.status, c.bStored ? 0 : 1) << c.input.size() << set.err;
+        const CliRun get = Cli({"cloud", "get", "--reveal", "--json"});
+        if (!c.bStored) {
+            EXPECT_FALSE(FileExists(kPrinterConf)) << c.input.size();
+            EXPECT_THAT(set.err, HasSubstr("nothing was stored"));
+            continue;
+        }
+        std::string secret = c.input.substr(0, c.input.find_first_of("\r\n"));
+        EXPECT_EQ(nlohmann::json::parse(get.out)["secret"], secret);
+        EXPECT_EQ(ReadFile(kPrinterConf).find(secret), std::string::npos);
+        EXPECT_EQ(nlohmann::json::parse(Cli({"cloud", "get", "--json"}).out)["secret"], nullptr);
+    }
+}
+
+// The command waiting at its password prompt on a pseudo-terminal.
+struct Prompt {
+    pid_t pid = -1;
+    int master = -1;
+};
+
+Prompt StartAtPrompt() {
+    Prompt p;
+    p.pid = forkpty(&p.master, nullptr, nullptr, nullptr);
+    if (p.pid == 0) {
+        execl(XAVO_CLI_PATH, XAVO_CLI_PATH, "cloud", "set", "u@example.com", static_cast<char *>(nullptr));
+        _exit(127);
+    }
+    return p;
+}
+
+bool EchoOn(int fd) {
+    termios t{};
+    return tcgetattr(fd, &t) == 0 && (t.c_lflag & ECHO) != 0;
+}
+
+TEST(Cli, PromptGivesTheTerminalBackOnCtrlCAndSigterm) {
+    for (int sig : {SIGINT, SIGTERM, SIGHUP}) {
+        Prompt p = StartAtPrompt();
+        ASSERT_GT(p.pid, 0);
+        ASSERT_TRUE(EchoOn(p.master));
+        // Bounded wait until the prompt has turned the echo off.
+        for (int i = 0; i < 500 && EchoOn(p.master); ++i) std::this_thread::sleep_for(std::chrono::milliseconds(10));
+        ASSERT_FALSE(EchoOn(p.master)) << "the prompt never turned the echo off";
+        kill(p.pid, sig);
+        int status = 0;
+        ASSERT_EQ(waitpid(p.pid, &status, 0), p.pid);
+        EXPECT_TRUE(WIFSIGNALED(status) && WTERMSIG(status) == sig) << sig;
+        EXPECT_TRUE(EchoOn(p.master)) << "echo left off after signal " << sig;
+        close(p.master);
+    }
+    EXPECT_FALSE(FileExists(kPrinterConf));
+
+    // Typed and entered: stored, echo back on, nothing of it echoed.
+    Prompt p = StartAtPrompt();
+    ASSERT_GT(p.pid, 0);
+    for (int i = 0; i < 500 && EchoOn(p.master); ++i) std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    ASSERT_EQ(write(p.master, "typed-secret\n", 13), 13);
+    std::string shown;
+    char buf[256];
+    pollfd pfd{p.master, POLLIN, 0};
+    for (ssize_t n; poll(&pfd, 1, 10000) == 1 && (n = read(p.master, buf, sizeof buf)) > 0;) {
+        shown.append(buf, static_cast<size_t>(n));
+    }
+    int status = 0;
+    ASSERT_EQ(waitpid(p.pid, &status, 0), p.pid);
+    EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << shown;
+    EXPECT_THAT(shown, AllOf(HasSubstr("password: "), Not(HasSubstr("typed-secret"))));
+    close(p.master);
+    EXPECT_EQ(nlohmann::json::parse(Cli({"cloud", "get", "--reveal", "--json"}).out)["secret"], "typed-secret");
+}
+
+TEST(Cli, PrinterSuppliedBytesGiveValidJsonAndHarmlessText) {
+    PlaceFile(kPrinterConf, "[p\xff\xfe]\n\tproducer = \x1b[2J\xc2\x9b" "31mACME\xff\n");
+    const CliRun json = Cli({"show", "p\xff\xfe", "--json"});
+    EXPECT_EQ(json.status, 0) << json.err;
+    EXPECT_EQ(JsonShapeProblem(json.out), "") << json.out;
+    EXPECT_TRUE(PythonAcceptsJsonLines(json.out));
+    const CliRun text = Cli({"show", "p\xff\xfe"});
+    EXPECT_THAT(text.out, HasSubstr("value=\\x1B[2J\\xC2\\x9B31mACME\\xFF"));
+    EXPECT_EQ(text.out.find('\x1b'), std::string::npos);
+    EXPECT_THAT(text.out, HasSubstr("id: p\\xFF\\xFE"));
 }
 
 }  // namespace

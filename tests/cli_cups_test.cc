@@ -1,0 +1,247 @@
+// The xavoprinter command against a real scheduler: results checked
+// against what CUPS holds afterwards (queues, their states, jobs), jobs
+// followed by their handle, network printers added all or nothing, and
+// one JSON shape per subcommand over a printer's whole life.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <cstdio>
+#include <map>
+#include <set>
+#include <string>
+#include <vector>
+
+#include "sandbox/cupsd.h"
+#include "sandbox/sandbox.h"
+#include "support/cli_run.h"
+
+using ::testing::HasSubstr;
+using ::testing::Not;
+using ::testing::StartsWith;
+using namespace xavo::test;
+using Json = nlohmann::json;
+
+namespace {
+
+constexpr char kUsbId[] = "04b8:0005:SN0001";
+
+XAVO_SANDBOX_PER_SUITE(CliCups);
+
+class CliCups : public ::testing::Test {
+protected:
+    // One scheduler for the suite; the appliance's own files and the
+    // queues are emptied before each test.
+    void SetUp() override {
+        Cupsd::Start();
+        Cupsd::RemoveAllQueues();
+        for (const char *path : {"/usr/xavo/etc/printer.conf", "/usr/xavo/etc/nptab", "/tmp/usbtab"}) std::remove(path);
+        if (FileExists("/sys/class/usbmisc/lp0")) UnplugUsbDevice("lp0");
+        PlaceFile("/tmp/letter.txt", "Dear printer,\n");
+    }
+    static void TearDownTestSuite() {
+        pid_t pid = Cupsd::Pid();
+        Cupsd::Stop();
+        if (pid > 0) waitpid(pid, nullptr, 0);
+    }
+
+    // The USB printer registered with its queue, left disabled so that
+    // jobs stay listed.
+    static void UsbPrinterWithQueue() {
+        PlugUsbDevice({});
+        ASSERT_EQ(Cli({"usb", "enable", "lp0", "1-1"}).status, 0);
+        ASSERT_EQ(Cli({"queue", "add", kUsbId}).status, 0);
+    }
+    static Json JsonOf(const std::vector<std::string> &args, int wantStatus) {
+        std::vector<std::string> withJson = args;
+        withJson.push_back("--json");
+        const CliRun r = Cli(withJson);
+        EXPECT_EQ(r.status, wantStatus) << ::testing::PrintToString(args) << "\n" << r.out << r.err;
+        EXPECT_EQ(JsonShapeProblem(r.out), "") << r.out;
+        return Json::parse(r.out);
+    }
+    static std::string QueueState(const std::string &id) {
+        const Json list = JsonOf({"list"}, 0);
+        for (const Json &p : list["printers"]) {
+            if (p["id"] == id) return p["queue_state"].is_null() ? "null" : p["queue_state"].get<std::string>();
+        }
+        return "no such printer";
+    }
+};
+
+TEST_F(CliCups, ListShowsEachPrintersQueueAndItsStateAndTheUsbipLock) {
+    PlugUsbDevice({});
+    ASSERT_EQ(Cli({"usb", "enable", "lp0", "1-1"}).status, 0);
+    const Json before = JsonOf({"list"}, 0)["printers"];
+    ASSERT_EQ(before.size(), 1u);
+    EXPECT_EQ(before[0], (Json{{"id", kUsbId}, {"kind", "usb"}, {"cups_queue", nullptr}, {"queue_state", nullptr},
+                               {"usbip_lock", "Free"}}));
+    ASSERT_EQ(Cli({"queue", "add", kUsbId}).status, 0);
+    EXPECT_EQ(QueueState(kUsbId), "disabled");
+    ASSERT_EQ(Cli({"queue", "enable", "usbprinter1"}).status, 0);
+    EXPECT_EQ(QueueState(kUsbId), "enabled");
+    Tool({"/usr/sbin/lpadmin", "-x", "usbprinter1"});
+    EXPECT_EQ(QueueState(kUsbId), "missing");
+    // Its own questions to CUPS never reach the terminal.
+    const CliRun text = Cli({"list"});
+    EXPECT_THAT(text.out, HasSubstr("id=04b8:0005:SN0001  kind=usb  cups_queue=usbprinter1  queue_state=missing  "
+                                    "usbip_lock=Free"));
+    EXPECT_EQ(text.err, "");
+}
+
+TEST_F(CliCups, PrintGivesEachJobAUniqueHandleThatJobWaitFollows) {
+    UsbPrinterWithQueue();
+    const Json first = JsonOf({"print", kUsbId, "/tmp/letter.txt", "--title", "letter"}, 0);
+    const Json second = JsonOf({"print", kUsbId, "/tmp/letter.txt", "--title", "letter"}, 0);
+    const std::string handle = first["job"];
+    EXPECT_THAT(handle, StartsWith("xavo-"));
+    EXPECT_NE(handle, second["job"]);
+    EXPECT_EQ(first["title"], handle + " letter");
+    ASSERT_TRUE(first["cups_job"].is_number()) << first;
+    EXPECT_NE(first["cups_job"], second["cups_job"]);
+    EXPECT_THAT(Tool({"/usr/bin/lpq", "-P", "usbprinter1"}), HasSubstr(handle));
+
+    const Json held = JsonOf({"job", "wait", kUsbId, handle, "--timeout", "1"}, 1);
+    EXPECT_EQ(held["complete"], false);
+    Tool({"/usr/bin/lprm", "-P", "usbprinter1", std::to_string(first["cups_job"].get<int>())});
+    EXPECT_EQ(JsonOf({"job", "wait", kUsbId, handle, "--timeout", "5"}, 0)["complete"], true);
+    // The other job, same title text, is still there.
+    EXPECT_EQ(JsonOf({"job", "wait", kUsbId, second["job"], "--timeout", "1"}, 1)["complete"], false);
+
+    const Json test = JsonOf({"print", "test-page", kUsbId}, 0);
+    EXPECT_EQ(test["job"], "testprint");
+    EXPECT_TRUE(test["cups_job"].is_number()) << test;
+}
+
+TEST_F(CliCups, SpoolCleanFailsWhileCupsStillListsJobs) {
+    UsbPrinterWithQueue();
+    ASSERT_EQ(Cli({"print", kUsbId, "/tmp/letter.txt"}).status, 0);
+    const Json left = JsonOf({"spool", "clean"}, 1);
+    EXPECT_EQ(left["cleaned"], false);
+    EXPECT_EQ(left["jobs_left"], 1);
+    EXPECT_THAT(left["error"]["message"].get<std::string>(), HasSubstr("still lists 1 job"));
+    Tool({"/usr/bin/cancel", "-a"});
+    EXPECT_EQ(JsonOf({"spool", "clean"}, 0)["cleaned"], true);
+}
+
+TEST_F(CliCups, NetAddUndoesItsStepsWhenTheQueueCannotBeMade) {
+    PlaceProgram("/usr/bin/lpadmin", "#!/bin/sh\nexit 1\n");
+    const Json add = JsonOf({"net", "add", "127.0.0.7", "office"}, 1);
+    Cupsd::Start();  // puts the real lpadmin back
+    EXPECT_THAT(ReadFile("/usr/xavo/etc/nptab"), Not(HasSubstr("127.0.0.7")));
+    EXPECT_EQ(add["undone"], Json::array({"network printer table line 127.0.0.7"}));
+    ASSERT_EQ(add["remains"].size(), 1u);
+    EXPECT_THAT(add["remains"][0].get<std::string>(), HasSubstr("section [127.0.0.7-office]"));
+    EXPECT_EQ(JsonOf({"list"}, 0)["count"], 0);
+}
+
+TEST_F(CliCups, NetAddRefusesAnAddressOrNameInUseUnlessReplacing) {
+    ASSERT_EQ(Cli({"net", "add", "127.0.0.5", "bigbrand"}).status, 0);
+    for (const auto &[ip, name] : std::vector<std::pair<std::string, std::string>>{{"127.0.0.5", "xb"},
+                                                                                    {"127.0.0.6", "bigbrand"}}) {
+        const CliRun r = Cli({"net", "add", ip, name});
+        EXPECT_EQ(r.status, 1) << ip << " " << name;
+        EXPECT_THAT(r.err, HasSubstr("127.0.0.5-bigbrand"));
+    }
+    EXPECT_EQ(ReadFile("/usr/xavo/etc/nptab"), "127.0.0.5=\"bigbrand\"\n");
+    EXPECT_TRUE(Queue("bigbrand").exists);
+
+    const Json replaced = JsonOf({"net", "add", "127.0.0.5", "xb", "--replace"}, 0);
+    EXPECT_EQ(replaced["replaced"], Json::array({"127.0.0.5-bigbrand"}));
+    EXPECT_EQ(ReadFile("/usr/xavo/etc/nptab"), "127.0.0.5=\"xb\"\n");
+    EXPECT_FALSE(Queue("bigbrand").exists);
+    EXPECT_TRUE(Queue("xb").exists);
+}
+
+TEST_F(CliCups, RemovalsThatMatchNothingFail) {
+    PlugUsbDevice({});
+    ASSERT_EQ(Cli({"usb", "enable", "lp0", "1-1"}).status, 0);
+    EXPECT_EQ(Cli({"queue", "remove", kUsbId}).status, 1);  // no queue name yet
+    ASSERT_EQ(Cli({"queue", "add", kUsbId}).status, 0);
+    EXPECT_EQ(Cli({"queue", "remove", kUsbId}).status, 0);
+    const CliRun again = Cli({"queue", "remove", kUsbId});
+    EXPECT_EQ(again.status, 1);
+    EXPECT_THAT(again.err, HasSubstr("nothing to remove: CUPS has no queue usbprinter1"));
+    EXPECT_EQ(Cli({"net", "remove", "127.0.0.9", "none"}).status, 1);
+    EXPECT_EQ(Cli({"usb", "disable", "--bus", "9-9"}).status, 1);
+}
+
+TEST_F(CliCups, EverySubcommandPrintsOneJsonShapeOnSuccessAndFailure) {
+    const std::set<std::string> kCommandWords = {
+        "list", "show", "usb", "enable", "disable", "devid", "reset", "queue", "add", "check", "ppd", "remove",
+        "purge-usb", "print", "test-page", "job", "wait", "spool", "clean", "net", "ping", "probe", "share",
+        "status", "cloud", "get", "set", "usbip", "lock-status", "eject", "release"};
+    PlugUsbDevice({});
+    PlaceFile("/tmp/pw", "secret-1\n");
+    const struct {
+        std::vector<std::string> args;
+        int status;
+        std::string input = "";
+    } runs[] = {
+        {{"list"}, 0},
+        {{"show", kUsbId}, 1},
+        {{"usb", "enable", "lp0", "1-1"}, 0},
+        {{"usb", "enable", "lp7", "1-1"}, 1},
+        {{"usb", "devid", "lp1"}, 1},
+        {{"usb", "reset", "lp1"}, 1},
+        {{"show", kUsbId}, 0},
+        {{"queue", "add", "no-such-printer"}, 1},
+        {{"queue", "add", kUsbId}, 0},
+        {{"queue", "enable", "usbprinter1"}, 0},
+        {{"queue", "disable", "usbprinter1"}, 0},
+        {{"queue", "disable", "nosuch"}, 1},
+        {{"queue", "check", kUsbId, "usbprinter1"}, 0},
+        {{"queue", "ppd", kUsbId}, 1},
+        {{"list"}, 0},
+        {{"print", kUsbId, "/tmp/letter.txt"}, 0},
+        {{"print", "no-such-printer", "/tmp/letter.txt"}, 1},
+        {{"print", "test-page", kUsbId}, 0},
+        {{"print", "test-page", "no-such-printer"}, 1},
+        {{"job", "wait", kUsbId, "testprint", "--timeout", "1"}, 1},
+        {{"spool", "clean"}, 1},
+        {{"net", "ping", "127.0.0.1"}, 0},
+        {{"net", "add", "127.0.0.5", "bigbrand"}, 0},
+        {{"net", "add", "127.0.0.5", "xb"}, 1},
+        {{"net", "check", "127.0.0.5", "bigbrand"}, 0},
+        {{"net", "check", "127.0.0.5"}, 0},
+        {{"net", "remove", "127.0.0.5", "bigbrand"}, 0},
+        {{"net", "remove", "127.0.0.5", "bigbrand"}, 1},
+        {{"net", "probe", "127.0.0.9"}, 1},
+        {{"queue", "remove", kUsbId}, 0},
+        {{"queue", "remove", kUsbId}, 1},
+        {{"queue", "purge-usb"}, 1},
+        {{"usb", "disable", "lp0"}, 0},
+        {{"usb", "disable", "lp0"}, 1},
+        {{"share", "status"}, 0},
+        {{"cloud", "get"}, 1},
+        {{"cloud", "set", "u@example.com"}, 1, ""},
+        {{"cloud", "set", "u@example.com"}, 0, "secret-1\n"},
+        {{"cloud", "get"}, 0},
+        {{"usbip", "lock-status", kUsbId}, 0},
+        {{"usbip", "eject", kUsbId}, 1},
+        {{"usbip", "release", kUsbId}, 1},
+    };
+    std::map<std::string, std::vector<std::string>> shapes;
+    std::string outputs;
+    for (const auto &run : runs) {
+        std::vector<std::string> args = run.args;
+        args.push_back("--json");
+        const CliRun r = Cli(args, run.input);
+        const std::string what = ::testing::PrintToString(run.args);
+        EXPECT_EQ(r.status, run.status) << what << "\n" << r.out << r.err;
+        ASSERT_EQ(JsonShapeProblem(r.out), "") << what << "\n" << r.out;
+        outputs += r.out;
+        EXPECT_EQ(r.out.find("\"-\""), std::string::npos) << what;
+        std::string path;
+        for (size_t i = 0; i < run.args.size() && kCommandWords.count(run.args[i]) != 0; ++i) {
+            path += (i ? " " : "") + run.args[i];
+        }
+        const auto [at, bNew] = shapes.emplace(path, JsonKeys(r.out));
+        if (!bNew) {
+            EXPECT_EQ(at->second, JsonKeys(r.out)) << what;
+        }
+    }
+    EXPECT_EQ(shapes.size(), 28u);
+    EXPECT_TRUE(PythonAcceptsJsonLines(outputs));
+}
+
+}  // namespace
