@@ -204,13 +204,16 @@ bool HasControl(std::string_view text) {
 
 std::vector<std::string> SplitLines(std::string_view text) {
     std::vector<std::string> lines;
-    while (!text.empty()) {
-        size_t nl = text.find('\n');
-        size_t len = nl == std::string_view::npos ? text.size() : nl + 1;
-        lines.emplace_back(text.substr(0, len));
-        text.remove_prefix(len);
-    }
+    while (!text.empty()) lines.emplace_back(NextLine(&text));
     return lines;
+}
+
+std::string_view NextLine(std::string_view *pRest) {
+    size_t nl = pRest->find('\n');
+    size_t len = nl == std::string_view::npos ? pRest->size() : nl + 1;
+    std::string_view line = pRest->substr(0, len);
+    pRest->remove_prefix(len);
+    return line;
 }
 
 std::string JoinLines(const std::vector<std::string> &lines) {
