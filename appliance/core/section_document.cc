@@ -3,6 +3,7 @@
 #include <sys/stat.h>
 #include <time.h>
 
+#include <cstring>
 #include <mutex>
 
 using namespace xavo::platform;
@@ -67,37 +68,76 @@ bool StampOf(const char *szPath, Stamp *pStamp) {
 
 }  // namespace
 
-SectionDocument::SectionDocument(std::string text) : text_(std::move(text)) {
-    for (std::string_view rest = text_; !rest.empty();) lines_.push_back(NextLine(&rest));
-    for (size_t i = 0; i < lines_.size(); ++i) {
-        if (auto name = ParseSectionHeader(lines_[i])) {
-            sections_.push_back({*name, i, i + 1});
-        } else if (!sections_.empty() && ParseSectionKeyLine(lines_[i])) {
-            sections_.back().bodyEnd = i + 1;
-        }
-    }
+size_t SectionDocument::LineEnd(size_t at) const {
+    size_t nl = text_.find('\n', at);
+    return nl == std::string::npos ? text_.size() : nl + 1;
 }
 
-std::vector<const SectionDocument::Section *> SectionDocument::Named(std::string_view name) const {
-    std::vector<const Section *> found;
-    for (const Section &s : sections_) {
-        if (s.name == name) found.push_back(&s);
+std::optional<size_t> SectionDocument::LineStartBefore(size_t pos) const {
+    size_t nl = pos == 0 ? std::string::npos : text_.rfind('\n', pos - 1);
+    size_t start = nl == std::string::npos ? 0 : nl + 1;
+    if (!Trim(std::string_view(text_).substr(start, pos - start)).empty()) return std::nullopt;
+    return start;
+}
+
+// A header line is one whose first non-blank character is "[" and that
+// ParseSectionHeader takes: the lines the reader starts sections at.
+size_t SectionDocument::NextHeader(size_t from) const {
+    for (size_t pos = text_.find('[', from); pos != std::string::npos; pos = text_.find('[', pos + 1)) {
+        auto start = LineStartBefore(pos);
+        if (start && ParseSectionHeader(Line(*start))) return *start;
+    }
+    return text_.size();
+}
+
+std::vector<SectionDocument::Section> SectionDocument::Named(std::string_view name) const {
+    {
+        // The calls of one setup ask for the same name in turn.
+        std::lock_guard lock(memoMutex_);
+        if (memo_ && memo_->first == name) return memo_->second;
+    }
+    std::vector<Section> found = Search(name);
+    std::lock_guard lock(memoMutex_);
+    memo_.emplace(std::string(name), found);
+    return found;
+}
+
+std::vector<SectionDocument::Section> SectionDocument::Search(std::string_view name) const {
+    std::vector<Section> found;
+    const std::string needle = "[" + std::string(name) + "]";
+    // Every header begins with "[" and most printer IDs with the same
+    // vendor and product: memmem's skipping search beats trying each "[".
+    auto find = [&](size_t from) {
+        const void *hit = ::memmem(text_.data() + from, text_.size() - from, needle.data(), needle.size());
+        return hit == nullptr ? std::string::npos : static_cast<size_t>(static_cast<const char *>(hit) - text_.data());
+    };
+    for (size_t pos = find(0); pos != std::string::npos; pos = find(pos + 1)) {
+        auto start = LineStartBefore(pos);
+        if (!start) continue;
+        // "[a]b]" names "a]b": the name runs to the line's last "]".
+        auto header = ParseSectionHeader(Line(*start));
+        if (!header || *header != name) continue;
+        Section s;
+        s.header = *start;
+        s.body = s.bodyEnd = LineEnd(*start);
+        const size_t next = NextHeader(s.body);
+        for (size_t at = s.body; at < next; at = LineEnd(at)) {
+            if (ParseSectionKeyLine(Line(at))) s.bodyEnd = LineEnd(at);
+        }
+        found.push_back(s);
+        pos = s.body - 1;
     }
     return found;
 }
 
-std::vector<std::pair<size_t, KeyValue>> SectionDocument::KeyLines(const std::vector<const Section *> &found) const {
+std::vector<std::pair<size_t, KeyValue>> SectionDocument::KeyLines(const std::vector<Section> &found) const {
     std::vector<std::pair<size_t, KeyValue>> keys;
-    for (const Section *s : found) {
-        for (size_t i = s->header + 1; i < s->bodyEnd; ++i) {
-            if (auto kv = ParseSectionKeyLine(lines_[i])) keys.emplace_back(i, *kv);
+    for (const Section &s : found) {
+        for (size_t at = s.body; at < s.bodyEnd; at = LineEnd(at)) {
+            if (auto kv = ParseSectionKeyLine(Line(at))) keys.emplace_back(at, *kv);
         }
     }
     return keys;
-}
-
-size_t SectionDocument::Offset(size_t iLine) const {
-    return iLine < lines_.size() ? static_cast<size_t>(lines_[iLine].data() - text_.data()) : text_.size();
 }
 
 std::string SectionDocument::Appended(std::string_view text) const {
@@ -109,26 +149,26 @@ std::string SectionDocument::Appended(std::string_view text) const {
     return out;
 }
 
-std::string SectionDocument::Replaced(const std::vector<const Section *> &found, std::string_view replacement) const {
+std::string SectionDocument::Replaced(const std::vector<Section> &found, std::string_view replacement) const {
     std::string out;
     out.reserve(text_.size() + replacement.size());
-    size_t next = 0;  // the first line not yet copied
-    for (const Section *s : found) {
-        out.append(text_, Offset(next), Offset(s->header) - Offset(next));
-        if (s == found.front()) out += replacement;
-        next = s->bodyEnd;
+    size_t next = 0;  // the first byte not yet copied
+    for (const Section &s : found) {
+        out.append(text_, next, s.header - next);
+        if (&s == &found.front()) out += replacement;
+        next = s.bodyEnd;
     }
-    out.append(text_, Offset(next));
+    out.append(text_, next);
     return out;
 }
 
-std::string SectionDocument::WithLine(size_t iLine, bool bReplace, std::string_view line) const {
+std::string SectionDocument::WithLine(size_t at, bool bReplace, std::string_view line) const {
     std::string out;
     out.reserve(text_.size() + 1 + line.size());
-    out.append(text_, 0, Offset(iLine));
+    out.append(text_, 0, at);
     if (!out.empty() && out.back() != '\n') out.push_back('\n');
     out += line;
-    out.append(text_, Offset(bReplace ? iLine + 1 : iLine));
+    out.append(text_, bReplace ? LineEnd(at) : at);
     return out;
 }
 

@@ -195,7 +195,7 @@ XAVO_PLATFORM_API int32_t ORLICFileSetSectionValue(const char *szPath, const cha
         for (const auto &[i, kv] : doc->KeyLines(found)) {
             if (kv.key == szKey) at = i;
         }
-        std::string text = at ? doc->WithLine(*at, true, line) : doc->WithLine(found.back()->bodyEnd, false, line);
+        std::string text = at ? doc->WithLine(*at, true, line) : doc->WithLine(found.back().bodyEnd, false, line);
         return Store(szPath, text) ? int32_t{0} : int32_t{-1};
     });
 }
