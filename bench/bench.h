@@ -15,6 +15,8 @@
 // nothing then.
 #pragma once
 
+#include <sys/resource.h>
+#include <sys/types.h>
 #include <time.h>
 
 #include <algorithm>
@@ -54,14 +56,55 @@ inline Options ParseOptions(int argc, char **argv, int fullRounds) {
     return o;
 }
 
-// What a sample measures.  Work done inside the calling process is timed
-// by the CPU time of the calling thread (user and system): on a machine
-// shared with other work, waiting for a CPU would otherwise swamp what is
-// measured.  Work done by other processes (the tools, cupsd) can only be
-// timed by the wall clock.
-enum class Clock { kThreadCpu, kWall };
+// What a sample measures.  On a machine shared with other work, waiting for
+// a CPU would swamp what is measured, so work is timed by the CPU time it
+// takes wherever that can be summed up: kThreadCpu, the calling thread's
+// (user and system); kCpuWithPeers, that plus the programs it started and
+// waited for plus the peer daemon (cupsd) whose id SetPeer() gave.  kWall is
+// the wall clock.  kReported takes the time the run itself reported with
+// ReportSample(), for work measured in another process.
+enum class Clock { kThreadCpu, kCpuWithPeers, kWall, kReported };
+
+inline double &ReportedSample() {
+    static double ms = 0;
+    return ms;
+}
+inline void ReportSample(double ms) { ReportedSample() = ms; }
+
+// The CPU time of this process's calling thread and of the children it has
+// waited for, in ms.
+inline double OwnAndChildrenCpuMs() {
+    timespec ts{};
+    clock_gettime(CLOCK_THREAD_CPUTIME_ID, &ts);
+    double ms = static_cast<double>(ts.tv_sec) * 1e3 + static_cast<double>(ts.tv_nsec) / 1e6;
+    rusage ru{};
+    getrusage(RUSAGE_CHILDREN, &ru);
+    for (const timeval &tv : {ru.ru_utime, ru.ru_stime}) {
+        ms += static_cast<double>(tv.tv_sec) * 1e3 + static_cast<double>(tv.tv_usec) / 1e3;
+    }
+    return ms;
+}
+
+inline pid_t &Peer() {
+    static pid_t peer = 0;
+    return peer;
+}
+inline void SetPeer(pid_t pid) { Peer() = pid; }
+
+// CPU time of a process in ms from /proc/PID/schedstat (nanoseconds, unlike
+// the clock ticks of /proc/PID/stat); 0 when it cannot be read.
+inline double ProcessCpuMs(pid_t pid) {
+    std::string path = "/proc/" + std::to_string(pid) + "/schedstat";
+    FILE *f = std::fopen(path.c_str(), "r");
+    if (f == nullptr) return 0;
+    unsigned long long ns = 0;
+    if (std::fscanf(f, "%llu", &ns) != 1) ns = 0;
+    std::fclose(f);
+    return static_cast<double>(ns) / 1e6;
+}
 
 inline double NowMs(Clock clock = Clock::kWall) {
+    if (clock == Clock::kCpuWithPeers) return OwnAndChildrenCpuMs() + (Peer() > 0 ? ProcessCpuMs(Peer()) : 0);
     timespec ts{};
     clock_gettime(clock == Clock::kWall ? CLOCK_MONOTONIC : CLOCK_THREAD_CPUTIME_ID, &ts);
     return static_cast<double>(ts.tv_sec) * 1e3 + static_cast<double>(ts.tv_nsec) / 1e6;
@@ -87,19 +130,25 @@ inline Stats Summarise(std::vector<double> samples) {
 struct Candidate {
     std::string name;
     std::function<void()> run;
+    std::function<void()> prepare = [] {};  // before each run, not timed
 };
 
 // The samples of every candidate (in ms), rounds interleaved; a first
 // untimed round warms caches and the page cache.
 inline std::vector<Stats> Interleaved(const Options &o, Clock clock, const std::vector<Candidate> &candidates) {
     std::vector<std::vector<double>> samples(candidates.size());
-    for (const Candidate &c : candidates) c.run();
+    for (const Candidate &c : candidates) {
+        c.prepare();
+        c.run();
+    }
     for (int round = 0; round < o.rounds; ++round) {
         for (size_t k = 0; k < candidates.size(); ++k) {
             size_t i = (k + static_cast<size_t>(round)) % candidates.size();
+            candidates[i].prepare();
+            ReportSample(0);
             double start = NowMs(clock);
             candidates[i].run();
-            samples[i].push_back(NowMs(clock) - start);
+            samples[i].push_back(clock == Clock::kReported ? ReportedSample() : NowMs(clock) - start);
         }
     }
     std::vector<Stats> stats;

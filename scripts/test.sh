@@ -30,4 +30,5 @@ for variant in plain asan; do
     status=1
   fi
 done
+bash scripts/bench.sh --smoke build/plain || status=1
 exit $status
