@@ -68,7 +68,9 @@ std::string BaseName(const std::string &path) {
 // that shows the end), so that a large file costs one read, not a read and
 // a reallocation per chunk; a file that grew meanwhile is still read whole.
 bool ReadWhole(int fd, size_t sizeHint, std::string *pText) {
-    std::string text(sizeHint + 1, '\0');
+    // Files of /proc and /sys tell a size of 0.
+    constexpr size_t kMinBlock = 512;
+    std::string text(std::max(sizeHint + 1, kMinBlock), '\0');
     size_t got = 0;
     for (;;) {
         if (got == text.size()) text.resize(std::min(2 * text.size(), static_cast<size_t>(kMaxFileSize) + 1));

@@ -1,12 +1,20 @@
-// The section operations of the core stand-in on the files the appliance
-// meets: where a section starts and ends when headers are indented, names
-// hold brackets or a header's text turns up inside a value; and a setup's
-// read kept for its next calls never outliving the file it was read from.
+// The core stand-in's shortcuts giving the same answers as the long way:
+// section operations that search for a header instead of splitting the
+// file (where a section starts and ends when headers are indented, names
+// hold brackets or a header's text turns up inside a value), a setup's read
+// kept for its next calls never outliving the file it was read from, call
+// counters without a lock, lists that start small, and the daemon found
+// last time looked at first but never taken on trust.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <signal.h>
+#include <spawn.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <atomic>
+#include <chrono>
 #include <string>
 #include <thread>
 #include <vector>
@@ -124,7 +132,7 @@ TEST(SectionFile, KeptReadNeverOutlivesTheFile) {
 
 // Every platform call passes through the counters; they stay exact when
 // several threads call at once.
-TEST(SectionFile, CallCountsStayExactAcrossThreads) {
+TEST(PlatformCounters, StayExactAcrossThreads) {
     XavoStandinReset();
     constexpr int kThreads = 4, kCalls = 2000;
     std::vector<std::thread> threads;
@@ -141,12 +149,49 @@ TEST(SectionFile, CallCountsStayExactAcrossThreads) {
 
 // A list asked for with a large capacity starts small and grows as it is
 // pushed to, its items where the record says.
-TEST(SectionFile, ListsGrowPastTheirFirstBlock) {
+TEST(PlatformLists, GrowPastTheirFirstBlock) {
     xavo::SzList list(ORLICSzListAlloc(1024));
     for (int i = 0; i < 3000; ++i) ASSERT_GT(ORLICSzListPush(list.addr(), std::to_string(i).c_str()), 0);
     ASSERT_EQ(ORLIC_SZLIST_COUNT(list.get()), 3000);
     EXPECT_GE(list.get()->iCapacity, 3000);
     EXPECT_STREQ(ORLIC_SZLIST_ITEMS(list.get())[2999], "2999");
+}
+
+// A stand-in cupsd: sleep under the daemon's name, so that the kernel
+// gives the process that command name.
+pid_t StartFakeCupsd() {
+    PlaceFile("/tmp/fake/cupsd", ReadFile("/bin/sleep"), 0755);
+    const char *argv[] = {"cupsd", "30", nullptr};
+    pid_t pid = -1;
+    EXPECT_EQ(posix_spawn(&pid, "/tmp/fake/cupsd", nullptr, nullptr, const_cast<char **>(argv), environ), 0);
+    // posix_spawn may return before the kernel renamed the child.
+    const std::string comm = "/proc/" + std::to_string(pid) + "/comm";
+    for (int i = 0; i < 400 && ReadFile(comm) != "cupsd\n"; ++i) std::this_thread::sleep_for(std::chrono::milliseconds(5));
+    return pid;
+}
+
+bool IsZombie(pid_t pid) {
+    for (const SandboxProcess &p : Descendants()) {
+        if (p.pid == pid) return p.state == 'Z';
+    }
+    return false;
+}
+
+TEST(PlatformServices, DaemonFoundLastIsCheckedAgainEveryTime) {
+    ASSERT_EQ(ORLIServiceIsRunning("cupsd"), 0);
+    const pid_t first = StartFakeCupsd();
+    EXPECT_EQ(ORLIServiceIsRunning("cupsd"), 1);
+    ASSERT_EQ(kill(first, SIGKILL), 0);
+    // A zombie is no running daemon, nor a reaped one.
+    for (int i = 0; i < 400 && !IsZombie(first); ++i) std::this_thread::sleep_for(std::chrono::milliseconds(5));
+    ASSERT_TRUE(IsZombie(first));
+    EXPECT_EQ(ORLIServiceIsRunning("cupsd"), 0) << "zombie";
+    ASSERT_EQ(waitpid(first, nullptr, 0), first);
+    EXPECT_EQ(ORLIServiceIsRunning("cupsd"), 0) << "reaped";
+    const pid_t second = StartFakeCupsd();
+    EXPECT_EQ(ORLIServiceIsRunning("cupsd"), 1);
+    kill(second, SIGKILL);
+    waitpid(second, nullptr, 0);
 }
 
 }  // namespace
