@@ -22,6 +22,7 @@
 #include "appliance/standin_control.h"
 #include "internal/guards.h"
 #include "sandbox/sandbox.h"
+#include "support/processes.h"
 #include "support/sections.h"
 #include "xavocore.h"
 
@@ -164,9 +165,7 @@ pid_t StartFakeCupsd() {
     const char *argv[] = {"cupsd", "30", nullptr};
     pid_t pid = -1;
     EXPECT_EQ(posix_spawn(&pid, "/tmp/fake/cupsd", nullptr, nullptr, const_cast<char **>(argv), environ), 0);
-    // posix_spawn may return before the kernel renamed the child.
-    const std::string comm = "/proc/" + std::to_string(pid) + "/comm";
-    for (int i = 0; i < 400 && ReadFile(comm) != "cupsd\n"; ++i) std::this_thread::sleep_for(std::chrono::milliseconds(5));
+    AwaitCommandName(pid, "cupsd");
     return pid;
 }
 
