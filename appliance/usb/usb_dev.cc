@@ -1,5 +1,6 @@
 // The appliance's USB library: the printers of the USB printer table and
 // their device information from sysfs.
+#include <algorithm>
 #include <climits>
 #include <cstdlib>
 #include <cstring>
@@ -45,6 +46,7 @@ bool ListDevices(uint32_t uKindMask, std::vector<std::string> *pNames) {
     // A name set twice is listed once, where it first appears; the set of
     // names seen keeps a long table linear.
     std::unordered_set<std::string_view> seen;
+    seen.reserve(static_cast<size_t>(std::count(text.begin(), text.end(), '\n')) + 1);
     for (std::string_view rest = text; !rest.empty();) {
         auto kv = ParseKeyValueLine(NextLine(&rest));
         if (!kv || kv->key.substr(0, 2) != kDevicePrefix) continue;
