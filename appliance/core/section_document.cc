@@ -12,9 +12,12 @@ namespace xavo::core {
 namespace {
 
 // What tells one version of a file from another.  Every writer of these
-// files replaces them by rename, so a new version is a new inode; a change
-// made in place (by hand) moves the change time.  The parse is kept only
-// while the file holds the same inode with the same size and times.
+// files replaces them by rename, so a new version is a new inode (should
+// the kept one's number be reused, the new file would also need its size,
+// and change times within the clock tick of the kept version's own write).
+// A change made in place, by hand, moves the times too, unless it falls in
+// that same tick.  The text is kept only while the file holds the same
+// inode with the same size and times.
 struct Stamp {
     dev_t dev = 0;
     ino_t ino = 0;
@@ -29,9 +32,9 @@ struct Stamp {
 };
 
 // A setup's section calls follow each other within milliseconds (a busy
-// printer lock keeps the last of them waiting up to five seconds); a parse
-// older than this is read again rather than trusted, and its memory goes
-// with the next call.
+// printer lock keeps the last of them waiting up to five seconds); a text
+// kept longer than this is read again rather than trusted, and its memory
+// goes with the next call.
 constexpr long kKeepSeconds = 10;
 
 struct Kept {
