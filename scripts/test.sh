@@ -35,4 +35,5 @@ for variant in plain asan; do
 done
 bash scripts/test-i386.sh || status=1
 bash scripts/test-install.sh || status=1
+bash scripts/bench.sh --smoke build/plain || status=1
 exit $status

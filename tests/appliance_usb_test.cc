@@ -1,6 +1,6 @@
 // The USB stand-in (libxavousb), for what the USB plug-in and listing tests
 // cannot see: where the names of an enumeration lie, a table that grows
-// between the two calls of one, and the kind of a device that is no printer.
+// between the two calls of one, a name the table holds twice, and the kind of a device that is no printer.
 #include <gtest/gtest.h>
 
 #include <string>
@@ -18,7 +18,8 @@ namespace {
 constexpr uint32_t kPrinters = 12;
 
 TEST(PlatformUsb, EnumeratedNamesLieInTheCallersBlockAndAGrownTableIsRefused) {
-    PlaceFile("/tmp/usbtab", "lp1=\"1-2\"\n# lp9=\"x\"\nusb0=\"1-3\"\nlp0=\"1-1.2\"\n");
+    // A name set twice is listed once, where it first appears.
+    PlaceFile("/tmp/usbtab", "lp1=\"1-2\"\n# lp9=\"x\"\nusb0=\"1-3\"\nlp0=\"1-1.2\"\nlp1=\"1-4\"\n");
     int32_t cb = 0;
     ASSERT_EQ(XAVOUSBDevEnum(kPrinters, nullptr, 0, &cb), 2);
     std::vector<char> block(static_cast<size_t>(cb));

@@ -15,6 +15,7 @@
 #include "support/cases.h"
 #include "support/fault_sweep.h"
 #include "support/logs.h"
+#include "support/processes.h"
 #include "xavoprinter.h"
 
 using ::testing::AllOf;
@@ -104,6 +105,7 @@ public:
         PlaceFile("/tmp/cupsd", ReadFile("/bin/sleep"), 0755);
         char *args[] = {const_cast<char *>("/tmp/cupsd"), const_cast<char *>("120"), nullptr};
         if (posix_spawn(&pid_, args[0], nullptr, nullptr, args, environ) != 0) pid_ = -1;
+        AwaitCommandName(pid_, "cupsd");
     }
     SchedulerStandIn(const SchedulerStandIn &) = delete;
     SchedulerStandIn &operator=(const SchedulerStandIn &) = delete;

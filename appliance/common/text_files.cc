@@ -64,6 +64,33 @@ std::string BaseName(const std::string &path) {
     return slash == std::string::npos ? path : path.substr(slash + 1);
 }
 
+// Reads to the end into one block of the size fstat gave (plus the byte
+// that shows the end), so that a large file costs one read, not a read and
+// a reallocation per chunk; a file that grew meanwhile is still read whole.
+bool ReadWhole(int fd, size_t sizeHint, std::string *pText) {
+    // Files of /proc and /sys tell a size of 0.
+    constexpr size_t kMinBlock = 512;
+    std::string text(std::max(sizeHint + 1, kMinBlock), '\0');
+    size_t got = 0;
+    for (;;) {
+        if (got == text.size()) text.resize(std::min(2 * text.size(), static_cast<size_t>(kMaxFileSize) + 1));
+        ssize_t n = ::read(fd, text.data() + got, text.size() - got);
+        if (n < 0) {
+            if (errno == EINTR) continue;
+            return false;
+        }
+        if (n == 0) break;
+        got += static_cast<size_t>(n);
+        if (got > static_cast<size_t>(kMaxFileSize)) {
+            errno = EFBIG;
+            return false;
+        }
+    }
+    text.resize(got);
+    *pText = std::move(text);
+    return true;
+}
+
 bool IsBlank(char c) { return c == ' ' || c == '\t' || c == '\r' || c == '\n' || c == '\v' || c == '\f'; }
 
 }  // namespace
@@ -80,20 +107,7 @@ ReadResult ReadTextFile(const char *szPath, std::string *pText) {
         return ReadResult::kFailed;
     }
     std::string text;
-    char chunk[8192];
-    for (;;) {
-        ssize_t n = ::read(fd.get(), chunk, sizeof chunk);
-        if (n < 0) {
-            if (errno == EINTR) continue;
-            return ReadResult::kFailed;
-        }
-        if (n == 0) break;
-        text.append(chunk, static_cast<size_t>(n));
-        if (text.size() > static_cast<size_t>(kMaxFileSize)) {
-            errno = EFBIG;
-            return ReadResult::kFailed;
-        }
-    }
+    if (!ReadWhole(fd.get(), static_cast<size_t>(st.st_size), &text)) return ReadResult::kFailed;
     *pText = std::move(text);
     return ReadResult::kOk;
 }
@@ -204,13 +218,16 @@ bool HasControl(std::string_view text) {
 
 std::vector<std::string> SplitLines(std::string_view text) {
     std::vector<std::string> lines;
-    while (!text.empty()) {
-        size_t nl = text.find('\n');
-        size_t len = nl == std::string_view::npos ? text.size() : nl + 1;
-        lines.emplace_back(text.substr(0, len));
-        text.remove_prefix(len);
-    }
+    while (!text.empty()) lines.emplace_back(NextLine(&text));
     return lines;
+}
+
+std::string_view NextLine(std::string_view *pRest) {
+    size_t nl = pRest->find('\n');
+    size_t len = nl == std::string_view::npos ? pRest->size() : nl + 1;
+    std::string_view line = pRest->substr(0, len);
+    pRest->remove_prefix(len);
+    return line;
 }
 
 std::string JoinLines(const std::vector<std::string> &lines) {

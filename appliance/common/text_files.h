@@ -48,6 +48,9 @@ bool HasControl(std::string_view text);
 // is kept as it is.
 std::vector<std::string> SplitLines(std::string_view text);
 std::string JoinLines(const std::vector<std::string> &lines);
+// The first line of *pRest (with its newline, if it has one), which is
+// advanced past it: walks a text's lines without copying them.
+std::string_view NextLine(std::string_view *pRest);
 
 // Copies a value read from a file into a caller's buffer (cbBuf > 0), cut
 // to fit as fixed-size fields are; the number of characters copied.

@@ -1,6 +1,7 @@
 // String lists and string hashes.
 #include "core/containers.h"
 
+#include <algorithm>
 #include <climits>
 #include <cstdlib>
 #include <cstring>
@@ -22,7 +23,12 @@ static_assert(sizeof(ORLICSzList) == kListHeaderBytes, "string list header");
 // A list created with capacity 0 gets room for this many items when it is
 // first pushed to.
 constexpr int32_t kMinListGrowth = 16;
+// Slots a new list gets at most, whatever capacity it was asked for.
+constexpr int32_t kInitialListSlots = 16;
 constexpr int32_t kMinHashCapacity = 16;
+
+// The next capacity of a growing vector: doubling keeps n inserts at O(n).
+size_t GrownCapacity(size_t n) { return n < 8 ? 16 : 2 * n; }
 
 size_t ListBytes(int32_t iCapacity) { return kListHeaderBytes + static_cast<size_t>(iCapacity) * sizeof(char *); }
 
@@ -171,7 +177,7 @@ void HashSet(ORLICSzHash **ppHash, std::string_view key, std::string_view value)
         auto grown = std::make_unique<ORLICSzHash>();
         grown->capacity = h->capacity * 2;
         std::vector<int32_t> fresh = grown->NewSlots(h->entries.size() + 1);
-        grown->entries.reserve(h->entries.size() + 1);
+        grown->entries.reserve(GrownCapacity(h->entries.size()));
         // Nothing below allocates: the old hash stays whole until here.
         for (auto &e : h->entries) grown->entries.push_back(std::move(e));
         grown->entries.push_back(std::move(entry));
@@ -182,7 +188,10 @@ void HashSet(ORLICSzHash **ppHash, std::string_view key, std::string_view value)
     }
     std::vector<int32_t> fresh;
     if (2 * (h->entries.size() + 1) >= h->slots.size()) fresh = h->NewSlots(h->entries.size() + 1);
-    h->entries.reserve(h->entries.size() + 1);
+    // Room is made before anything changes (push_back below cannot throw),
+    // and geometrically: reserving exactly one more would copy every entry
+    // on every insert, and a hash of n keys would cost n * n.
+    if (h->entries.size() == h->entries.capacity()) h->entries.reserve(GrownCapacity(h->entries.size()));
     h->entries.push_back(std::move(entry));
     if (!fresh.empty()) {
         h->Index(std::move(fresh));
@@ -214,7 +223,11 @@ using namespace xavo::core;
 
 XAVO_PLATFORM_API ORLICSzList *ORLICSzListAlloc(int32_t iCapacity) {
     if (XAVO_INJECTED()) return nullptr;
-    ORLICSzList *p = NewList(iCapacity);
+    // The capacity asked for is a hint: callers ask for 1024 slots for
+    // lists that mostly hold a handful of fields (one list per table line),
+    // and clearing 8 KiB for each would cost more than the line's work.
+    // The list starts small and grows as items are pushed.
+    ORLICSzList *p = NewList(iCapacity < 0 ? iCapacity : std::min(iCapacity, kInitialListSlots));
     if (p == nullptr) SetError(iCapacity < 0 ? kErrBadParameters : kErrOutOfMemory, kUnit, __LINE__);
     return p;
 }

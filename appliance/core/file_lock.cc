@@ -93,10 +93,13 @@ bool MakeParentDirs(const std::string &path) {
 // One non-blocking attempt: the locked descriptor, -1 when the lock is held
 // elsewhere (errno EWOULDBLOCK), -2 when the lock file cannot be opened.
 int TryLockFile(const char *szPath, bool bExclusive) {
-    if (!MakeParentDirs(szPath)) return -2;
     // O_NOFOLLOW: /run is the appliance's, but a lock file is never worth
-    // following a link for.  Read-only is enough for flock().
-    int fd = ::open(szPath, O_RDONLY | O_CREAT | O_NOFOLLOW | O_CLOEXEC | O_NOCTTY, kLockFileMode);
+    // following a link for.  Read-only is enough for flock().  The
+    // directories are made only when missing (after a restart): the lock is
+    // taken around every write of the printer configuration.
+    constexpr int kFlags = O_RDONLY | O_CREAT | O_NOFOLLOW | O_CLOEXEC | O_NOCTTY;
+    int fd = ::open(szPath, kFlags, kLockFileMode);
+    if (fd < 0 && errno == ENOENT && MakeParentDirs(szPath)) fd = ::open(szPath, kFlags, kLockFileMode);
     if (fd < 0) return -2;
     int r;
     do {

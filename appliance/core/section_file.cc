@@ -14,55 +14,18 @@
 
 #include "common/text_files.h"
 #include "core/containers.h"
+#include "core/section_document.h"
 
 using namespace xavo::platform;
+using xavo::core::DocumentPtr;
+using xavo::core::ForgetSectionDocument;
+using xavo::core::LoadSectionDocument;
 
 namespace {
 constexpr char kUnit[] = "section_file";
 // The layout of a single key set by ORLICFileSetSectionValue, the same as
 // the printer library's whole-section writes.
 constexpr char kSingleKeyFormat[] = "\t%s = %s\n";
-
-struct Section {
-    std::string name;
-    size_t header = 0;   // line of "[name]"
-    size_t bodyEnd = 0;  // one past the last key line (or the header)
-};
-
-struct Document {
-    std::vector<std::string> lines;  // each with its newline
-    std::vector<Section> sections;
-
-    explicit Document(std::string_view text) : lines(SplitLines(text)) {
-        for (size_t i = 0; i < lines.size(); ++i) {
-            if (auto name = ParseSectionHeader(lines[i])) {
-                sections.push_back({std::string(*name), i, i + 1});
-            } else if (!sections.empty() && ParseSectionKeyLine(lines[i])) {
-                sections.back().bodyEnd = i + 1;
-            }
-        }
-    }
-
-    std::vector<const Section *> Named(std::string_view name) const {
-        std::vector<const Section *> found;
-        for (const Section &s : sections) {
-            if (s.name == name) found.push_back(&s);
-        }
-        return found;
-    }
-
-    // The key lines of the given sections, in file order, with their line
-    // numbers.
-    std::vector<std::pair<size_t, KeyValue>> KeyLines(const std::vector<const Section *> &found) const {
-        std::vector<std::pair<size_t, KeyValue>> keys;
-        for (const Section *s : found) {
-            for (size_t i = s->header + 1; i < s->bodyEnd; ++i) {
-                if (auto kv = ParseSectionKeyLine(lines[i])) keys.emplace_back(i, *kv);
-            }
-        }
-        return keys;
-    }
-};
 
 // Names and keys are refused rather than altered: a changed name would be
 // another printer, and a line break would forge lines of its own.
@@ -100,19 +63,21 @@ bool SectionText(const char *szName, const ORLICSzHash *pHash, const char *szLin
 // The file of the operations that work inside an existing section: nothing,
 // with the last error set, when it cannot be read or has no section of the
 // name.
-std::optional<Document> LoadWithSection(const char *szPath, const char *szSection, int iLine) {
-    std::string text;
-    if (!LoadTextFile(szPath, false, &text, kUnit, iLine)) return std::nullopt;
-    Document doc(text);
-    if (doc.Named(szSection).empty()) {
+DocumentPtr LoadWithSection(const char *szPath, const char *szSection, int iLine) {
+    DocumentPtr doc = LoadSectionDocument(szPath, false, kUnit, iLine);
+    if (!doc) return nullptr;
+    if (doc->Named(szSection).empty()) {
         SetError(kErrNotFound, kUnit, iLine);
-        return std::nullopt;
+        return nullptr;
     }
     return doc;
 }
 
-void EndWithNewline(std::string *pLine) {
-    if (!pLine->empty() && pLine->back() != '\n') pLine->push_back('\n');
+// Every write of a section file goes through here: the parse kept of the
+// file's old version is dropped with it.
+bool Store(const char *szPath, std::string_view text) {
+    ForgetSectionDocument(szPath);
+    return StoreTextFile(szPath, text, kUnit);
 }
 
 }  // namespace
@@ -142,17 +107,15 @@ XAVO_PLATFORM_API int32_t ORLICFileAddSection(const char *szPath, const char *sz
         return -1;
     }
     return XAVO_GUARD(int32_t{-1}, [&] {
-        std::string text;
-        if (!LoadTextFile(szPath, true, &text, kUnit, __LINE__)) return int32_t{-1};
-        if (!Document(text).Named(szSection).empty()) return int32_t{0};
+        DocumentPtr doc = LoadSectionDocument(szPath, true, kUnit, __LINE__);
+        if (!doc) return int32_t{-1};
+        if (!doc->Named(szSection).empty()) return int32_t{0};
         std::string section;
         if (!SectionText(szSection, pHash, szLineFormat, &section)) {
             SetError(kErrBadParameters, kUnit, __LINE__);
             return int32_t{-1};
         }
-        EndWithNewline(&text);
-        text += section;
-        return StoreTextFile(szPath, text, kUnit) ? int32_t{1} : int32_t{-1};
+        return Store(szPath, doc->Appended(section)) ? int32_t{1} : int32_t{-1};
     });
 }
 
@@ -166,12 +129,11 @@ XAVO_PLATFORM_API int32_t ORLICFileSetSection(const char *szPath, const char *sz
         return -1;
     }
     return XAVO_GUARD(int32_t{-1}, [&] {
-        std::string text;
-        if (!LoadTextFile(szPath, true, &text, kUnit, __LINE__)) return int32_t{-1};
-        Document doc(text);
+        DocumentPtr doc = LoadSectionDocument(szPath, true, kUnit, __LINE__);
+        if (!doc) return int32_t{-1};
         // Renaming onto another existing section would merge two printers'
         // records; refuse it.
-        if (std::strcmp(szOldSection, szNewSection) != 0 && !doc.Named(szNewSection).empty()) {
+        if (std::strcmp(szOldSection, szNewSection) != 0 && !doc->Named(szNewSection).empty()) {
             SetError(kErrBadParameters, kUnit, __LINE__);
             return int32_t{-1};
         }
@@ -180,28 +142,13 @@ XAVO_PLATFORM_API int32_t ORLICFileSetSection(const char *szPath, const char *sz
             SetError(kErrBadParameters, kUnit, __LINE__);
             return int32_t{-1};
         }
-        auto found = doc.Named(szOldSection);
-        if (found.empty()) {
-            EndWithNewline(&text);
-            text += section;
-            return StoreTextFile(szPath, text, kUnit) ? int32_t{1} : int32_t{-1};
-        }
         // The new section takes the place of the first one of the old name;
         // further ones of that name (which readers merge into it) go, so
         // that the file holds exactly the caller's pairs.  Comments and
         // blank lines after a section's last key stay with the file.
-        for (auto it = found.rbegin(); it != found.rend(); ++it) {
-            const Section *s = *it;
-            auto first = doc.lines.begin() + static_cast<std::ptrdiff_t>(s->header);
-            auto last = doc.lines.begin() + static_cast<std::ptrdiff_t>(s->bodyEnd);
-            if (s == found.front()) {
-                *first = section;
-                doc.lines.erase(first + 1, last);
-            } else {
-                doc.lines.erase(first, last);
-            }
-        }
-        return StoreTextFile(szPath, JoinLines(doc.lines), kUnit) ? int32_t{1} : int32_t{-1};
+        auto found = doc->Named(szOldSection);
+        std::string text = found.empty() ? doc->Appended(section) : doc->Replaced(found, section);
+        return Store(szPath, text) ? int32_t{1} : int32_t{-1};
     });
 }
 
@@ -248,13 +195,7 @@ XAVO_PLATFORM_API int32_t ORLICFileSetSectionValue(const char *szPath, const cha
         for (const auto &[i, kv] : doc->KeyLines(found)) {
             if (kv.key == szKey) at = i;
         }
-        if (at) {
-            doc->lines[*at] = line;
-        } else {
-            size_t after = found.back()->bodyEnd;
-            EndWithNewline(&doc->lines[after - 1]);
-            doc->lines.insert(doc->lines.begin() + static_cast<std::ptrdiff_t>(after), line);
-        }
-        return StoreTextFile(szPath, JoinLines(doc->lines), kUnit) ? int32_t{0} : int32_t{-1};
+        std::string text = at ? doc->WithLine(*at, true, line) : doc->WithLine(found.back().bodyEnd, false, line);
+        return Store(szPath, text) ? int32_t{0} : int32_t{-1};
     });
 }

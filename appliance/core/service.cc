@@ -1,8 +1,10 @@
 // The appliance's services the printer library checks and starts.
+#include <atomic>
 #include <cstring>
 #include <string>
 #include <vector>
 
+#include "core/daemon_lookup.h"
 #include "core/internal.h"
 
 using namespace xavo::platform;
@@ -15,19 +17,18 @@ struct Service {
     const char *process;   // command name of its running daemon
     const char *program;   // started with these arguments; daemonises
     std::vector<std::string> argv;
+    mutable std::atomic<pid_t> lastFound{0};  // looked at first next time
 };
 
-const std::vector<Service> &Services() {
-    static const std::vector<Service> services = {
-        {"cupsd", "cupsd", "/usr/sbin/cupsd", {"/usr/sbin/cupsd"}},
-        {"avahi", "avahi-daemon", "/usr/sbin/avahi-daemon", {"/usr/sbin/avahi-daemon", "-D"}},
-    };
-    return services;
-}
+// An array, not a vector: the remembered daemon makes a service immovable.
+Service kServices[] = {
+    {"cupsd", "cupsd", "/usr/sbin/cupsd", {"/usr/sbin/cupsd"}},
+    {"avahi", "avahi-daemon", "/usr/sbin/avahi-daemon", {"/usr/sbin/avahi-daemon", "-D"}},
+};
 
 const Service *Find(const char *szService) {
     if (szService == nullptr) return nullptr;
-    for (const Service &s : Services()) {
+    for (const Service &s : kServices) {
         if (std::strcmp(s.name, szService) == 0) return &s;
     }
     return nullptr;
@@ -44,7 +45,7 @@ XAVO_PLATFORM_API int32_t ORLIServiceIsRunning(const char *szService) {
         SetError(kErrBadParameters, kUnit, __LINE__);
         return -1;
     }
-    return XAVO_GUARD(int32_t{-1}, [&] { return xavo::core::ProcessAlive(service->process) ? int32_t{1} : int32_t{0}; });
+    return XAVO_GUARD(int32_t{-1}, [&] { return xavo::core::FindDaemon(service->process, &service->lastFound) != 0 ? int32_t{1} : int32_t{0}; });
 }
 
 // 0 when the service runs already or its start command succeeded (the
@@ -57,7 +58,7 @@ XAVO_PLATFORM_API int32_t ORLIServiceStart(const char *szService, int32_t /*iFla
         return -1;
     }
     return XAVO_GUARD(int32_t{-1}, [&] {
-        if (xavo::core::ProcessAlive(service->process)) return int32_t{0};
+        if (xavo::core::FindDaemon(service->process, &service->lastFound) != 0) return int32_t{0};
         Failure failure;
         if (xavo::core::RunAndWait(service->program, service->argv, &failure) != 0) {
             SetError(failure.code, kUnit, failure.line);

@@ -1,9 +1,12 @@
 // The appliance's USB library: the printers of the USB printer table and
 // their device information from sysfs.
+#include <algorithm>
 #include <climits>
 #include <cstdlib>
 #include <cstring>
 #include <string>
+#include <string_view>
+#include <unordered_set>
 #include <vector>
 
 #include "common/text_files.h"
@@ -40,13 +43,14 @@ bool ListDevices(uint32_t uKindMask, std::vector<std::string> *pNames) {
             break;
     }
     if ((uKindMask & XAVOUSB_KIND_PRINTER_MASK) == 0) return true;
-    for (const std::string &line : SplitLines(text)) {
-        auto kv = ParseKeyValueLine(line);
+    // A name set twice is listed once, where it first appears; the set of
+    // names seen keeps a long table linear.
+    std::unordered_set<std::string_view> seen;
+    seen.reserve(static_cast<size_t>(std::count(text.begin(), text.end(), '\n')) + 1);
+    for (std::string_view rest = text; !rest.empty();) {
+        auto kv = ParseKeyValueLine(NextLine(&rest));
         if (!kv || kv->key.substr(0, 2) != kDevicePrefix) continue;
-        std::string name(kv->key);
-        bool bSeen = false;
-        for (const std::string &n : *pNames) bSeen = bSeen || n == name;
-        if (!bSeen) pNames->push_back(std::move(name));
+        if (seen.insert(kv->key).second) pNames->emplace_back(kv->key);
     }
     return true;
 }

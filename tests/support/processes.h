@@ -5,7 +5,10 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <chrono>
 #include <functional>
+#include <string>
+#include <thread>
 #include <vector>
 
 #include "sandbox/sandbox.h"
@@ -46,6 +49,16 @@ inline void RunAtOnce(int n, const std::function<bool(int)> &body) {
         int status = 0;
         EXPECT_EQ(waitpid(pid, &status, 0), pid);
         EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << "process " << pid;
+    }
+}
+
+// posix_spawn may return before the kernel gave the child the command name
+// of its new program: waits (bounded) until it has it, so that a lookup of
+// the process by name finds it.
+inline void AwaitCommandName(pid_t pid, const std::string &name) {
+    const std::string comm = "/proc/" + std::to_string(pid) + "/comm";
+    for (int i = 0; pid > 0 && i < 400 && ReadFile(comm) != name + "\n"; ++i) {
+        std::this_thread::sleep_for(std::chrono::milliseconds(5));
     }
 }
 
