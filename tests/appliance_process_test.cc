@@ -1,0 +1,280 @@
+// The platform stand-in's process runner, driven directly: every program
+// run ends within its time limit together with what it started, the
+// programs' standard error goes to syslog instead of the caller's terminal,
+// only the appliance's own file name pattern is expanded, and a caller's
+// SIGCHLD handling never changes a result.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <cerrno>
+#include <chrono>
+#include <cstdio>
+#include <functional>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "appliance/standin_control.h"
+#include "sandbox/sandbox.h"
+#include "support/logs.h"
+#include "xavocore.h"
+
+using ::testing::ElementsAre;
+using ::testing::IsEmpty;
+using namespace xavo::test;
+
+namespace {
+
+constexpr char kTool[] = "/usr/bin/xavo-tool";
+constexpr double kGrace = 2.0;  // the runner's SIGTERM-to-SIGKILL grace
+constexpr double kSlack = 1.5;  // a loaded machine's delay on top
+
+double Since(std::chrono::steady_clock::time_point start) {
+    return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
+}
+
+// All of a stream; a read that a signal interrupted is taken again.
+std::string ReadAll(FILE *stream) {
+    std::string text;
+    for (;;) {
+        errno = 0;
+        const int ch = std::fgetc(stream);
+        if (ch != EOF) {
+            text += static_cast<char>(ch);
+        } else if (errno == EINTR) {
+            std::clearerr(stream);
+        } else {
+            return text;
+        }
+    }
+}
+
+// Whether a process of that id still runs (a zombie has ended).
+bool Running(pid_t pid) {
+    const std::string stat = ReadFile("/proc/" + std::to_string(pid) + "/stat");
+    const size_t close = stat.rfind(')');
+    return close != std::string::npos && close + 2 < stat.size() && stat[close + 2] != 'Z';
+}
+
+// Signals sent are taken a moment later: up to a second for the process to
+// end.
+bool EndsSoon(pid_t pid) {
+    for (int i = 0; i < 100 && Running(pid); ++i) std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    return !Running(pid);
+}
+
+// Orphans of a stopped tool come to the sandbox's subreaper, as they come to
+// init on the appliance: reaped here as init would, then nothing may be
+// left.
+bool NothingLeft() {
+    for (int i = 0; i < 100; ++i) {
+        for (const SandboxProcess &p : Descendants()) {
+            if (p.state == 'Z') waitpid(p.pid, nullptr, WNOHANG);
+        }
+        if (Descendants().empty()) return true;
+        std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    }
+    return false;
+}
+
+// Each way of running a program, reduced to "result, output read".
+struct EntryPoint {
+    const char *szName;
+    std::function<int32_t(std::string *)> run;
+};
+const EntryPoint kEntryPoints[] = {
+    {"ORLICExec", [](std::string *) { return ORLICExec(kTool, "a", nullptr, nullptr, nullptr); }},
+    {"ORLICExecl", [](std::string *) { return ORLICExecl(kTool, 0xBB, "a", nullptr); }},
+    {"ORLICExecv",
+     [](std::string *) {
+         char *const argv[] = {const_cast<char *>(kTool), const_cast<char *>("a"), nullptr};
+         return ORLICExecv(kTool, argv, 1);
+     }},
+    {"ORLICPopen",
+     [](std::string *pOut) {
+         FILE *stream = ORLICPopen(kTool, "r", "a", nullptr);
+         if (stream == nullptr) return int32_t{-100};
+         *pOut = ReadAll(stream);
+         return ORLICPclose(stream);
+     }},
+};
+
+// A tool that prints a line, starts a helper of its own that never ends,
+// and never ends either; with bStubborn both ignore SIGTERM.
+std::string NeverEnding(bool bStubborn) {
+    return std::string("#!/bin/sh\n") + (bStubborn ? "trap '' TERM\n" : "") +
+           "echo started\nsleep 1000 &\necho $! > /tmp/helper.pid\nwhile :; do sleep 1; done\n";
+}
+
+}  // namespace
+
+TEST(RunnerTimeLimit, EveryEntryPointStopsTheToolAndWhatItStartedAtTheLimit) {
+    XavoStandinSetToolTimeLimit(1);
+    for (const EntryPoint &e : kEntryPoints) {
+        PlaceProgram(kTool, NeverEnding(false));
+        ORLICErrSetEx(0, "", 0);
+        std::string out;
+        const auto start = std::chrono::steady_clock::now();
+        EXPECT_EQ(e.run(&out), -1) << e.szName;
+        const double seconds = Since(start);
+        EXPECT_GE(seconds, 0.9) << e.szName;
+        EXPECT_LT(seconds, 1 + kSlack) << e.szName << ": the tool ends at SIGTERM";
+        EXPECT_EQ(ORLICErrGet(), 0x2A00u) << e.szName;
+        if (std::string(e.szName) == "ORLICPopen") {
+            EXPECT_EQ(out, "started\n");
+        }
+        EXPECT_TRUE(EndsSoon(std::stoi(ReadFile("/tmp/helper.pid")))) << e.szName << ": its group is stopped";
+        EXPECT_THAT(ProgramLogs(), ElementsAre("7 xavo-tool: no exit within its time limit, stopped")) << e.szName;
+        EXPECT_TRUE(NothingLeft()) << e.szName;
+    }
+    // SIGKILL after the grace, for a tool and a helper that ignore SIGTERM.
+    PlaceProgram(kTool, NeverEnding(true));
+    const auto start = std::chrono::steady_clock::now();
+    EXPECT_EQ(ORLICExec(kTool, nullptr, nullptr, nullptr, nullptr), -1);
+    EXPECT_GE(Since(start), 1 + kGrace - 0.2);
+    EXPECT_LT(Since(start), 1 + kGrace + kSlack);
+    EXPECT_TRUE(EndsSoon(std::stoi(ReadFile("/tmp/helper.pid"))));
+    EXPECT_TRUE(NothingLeft());
+    // 0 gives every tool its own limit again (more than 1.5 s).
+    PlaceProgram(kTool, "#!/bin/sh\nsleep 1.5\n");
+    XavoStandinSetToolTimeLimit(0);
+    EXPECT_EQ(ORLICExec(kTool, nullptr, nullptr, nullptr, nullptr), 0);
+}
+
+TEST(RunnerStderr, LinesGoToSyslogTaggedWithTheToolNeverToTheCallersStderr) {
+    PlaceProgram(kTool, "#!/bin/sh\n"
+                        "echo 'first line' >&2\n"
+                        "echo 'xavo-tool: tagged already' >&2\n"
+                        "printf 'colour \\033[31mred\\r\\n\\n' >&2\n"
+                        "head -c 1500 /dev/zero | tr '\\0' a >&2\n"
+                        "echo out\n"
+                        "printf 'no newline' >&2\n"
+                        "exit 3\n");
+    const std::vector<std::string> expected = {
+        "7 xavo-tool: first line", "7 xavo-tool: tagged already", "7 xavo-tool: colour ?[31mred",
+        "7 xavo-tool: " + std::string(1024, 'a'), "7 xavo-tool: " + std::string(1500 - 1024, 'a') + "no newline"};
+    // The caller's descriptor 2 becomes a file for the time of the calls.
+    FILE *pCaught = std::tmpfile();
+    ASSERT_NE(pCaught, nullptr);
+    const int savedStderr = dup(2);
+    dup2(fileno(pCaught), 2);
+    const int32_t iExec = ORLICExec(kTool, nullptr, nullptr, nullptr, nullptr);
+    const std::vector<std::string> execLines = ProgramLogs();
+    FILE *stream = ORLICPopen(kTool, "r", nullptr);
+    const std::string out = stream != nullptr ? ReadAll(stream) : "";
+    const int32_t iClosed = stream != nullptr ? ORLICPclose(stream) : -100;
+    dup2(savedStderr, 2);
+    close(savedStderr);
+    EXPECT_EQ(iExec, 3);
+    EXPECT_EQ(execLines, expected);
+    EXPECT_EQ(out, "out\n");
+    EXPECT_EQ(iClosed, 3);
+    EXPECT_EQ(ProgramLogs(), expected);
+    EXPECT_EQ(std::ftell(pCaught), 0) << "nothing on the caller's stderr";
+    std::fclose(pCaught);
+
+    // Far more than a pipe holds, while the caller waits or reads: relayed
+    // as it comes, so the tool never blocks on it.
+    PlaceProgram(kTool, "#!/bin/sh\nseq 1 20000 | sed 's/^/line /' >&2\necho done\n");
+    XavoStandinSetToolTimeLimit(20);
+    EXPECT_EQ(ORLICExec(kTool, nullptr, nullptr, nullptr, nullptr), 0);
+    stream = ORLICPopen(kTool, "r", nullptr);
+    ASSERT_NE(stream, nullptr);
+    EXPECT_EQ(ReadAll(stream), "done\n");
+    EXPECT_EQ(ORLICPclose(stream), 0);
+    const std::vector<std::string> lines = ProgramLogs();
+    ASSERT_EQ(lines.size(), 40000u);
+    EXPECT_EQ(lines[19999], "7 xavo-tool: line 20000");
+}
+
+// Only "/var/services/printer/*.*" given to /bin/rm is a pattern; any other
+// argument is a name, whatever characters it holds.
+TEST(RunnerPatterns, OnlyTheSpoolPatternOfRmIsExpanded) {
+    for (const char *name : {"/tmp/p/a1", "/tmp/p/a2", "/tmp/src", "/var/services/printer/job.pdf",
+                             "/var/services/printer/nodot", "/var/services/printer/.hidden"}) {
+        PlaceFile(name, name);
+    }
+    EXPECT_EQ(ORLICExec("/bin/cp", "-f", "/tmp/src", "/tmp/p/a*", nullptr), 0);
+    EXPECT_EQ(ReadFile("/tmp/p/a*"), "/tmp/src") << "a new file of that very name";
+    EXPECT_EQ(ReadFile("/tmp/p/a1"), "/tmp/p/a1");
+    EXPECT_EQ(ORLICExec("/bin/rm", "-f", "/tmp/p/a?", "/tmp/p/[a]2", nullptr), 0);
+    EXPECT_TRUE(FileExists("/tmp/p/a1") && FileExists("/tmp/p/a2"));
+    EXPECT_EQ(ORLICExec("/bin/cp", "/var/services/printer/*.*", "/tmp/p/", nullptr, nullptr), 1)
+        << "no file of that name: cp fails";
+    EXPECT_TRUE(FileExists("/var/services/printer/job.pdf"));
+
+    EXPECT_EQ(ORLICExec("/bin/rm", "-rf", "/var/services/printer/*.*", nullptr, nullptr), 0);
+    EXPECT_FALSE(FileExists("/var/services/printer/job.pdf"));
+    EXPECT_TRUE(FileExists("/var/services/printer/nodot"));
+    EXPECT_TRUE(FileExists("/var/services/printer/.hidden"));
+    EXPECT_EQ(ORLICExec("/bin/rm", "-rf", "/var/services/printer/*.*", nullptr, nullptr), 0)
+        << "nothing matches: rm -f of the pattern's own name";
+}
+
+// A caller that ignores SIGCHLD, reaps every child in its handler, or
+// blocks SIGCHLD gets each run's own result, and its handler is never run
+// for the runner's programs, only for its own children.
+TEST(RunnerSigchld, CallersHandlingOfSigchldNeverChangesAResult) {
+    static std::atomic<int> handled{0};
+    struct Setting {
+        const char *szName;
+        void (*handler)(int);
+        int flags;
+        bool bBlock;
+    } const settings[] = {
+        {"default", SIG_DFL, 0, false},
+        {"ignored", SIG_IGN, 0, false},
+        {"reaping handler", [](int) { ++handled; while (waitpid(-1, nullptr, WNOHANG) > 0) {} }, SA_RESTART, false},
+        {"reaping handler, no restart", [](int) { ++handled; while (waitpid(-1, nullptr, WNOHANG) > 0) {} }, 0, false},
+        {"blocked", SIG_DFL, 0, true},
+    };
+    PlaceProgram(kTool, "#!/bin/sh\n[ -z \"$2\" ] || echo \"$1\"\nsleep 0.05\nexit \"$1\"\n");
+    for (const Setting &s : settings) {
+        struct sigaction sa {}, old {};
+        sa.sa_handler = s.handler;
+        sa.sa_flags = s.flags;
+        sigaction(SIGCHLD, &sa, &old);
+        sigset_t chld, oldMask;
+        sigemptyset(&chld);
+        sigaddset(&chld, SIGCHLD);
+        if (s.bBlock) sigprocmask(SIG_BLOCK, &chld, &oldMask);
+        handled = 0;
+        // A child of the caller's own ends while a run is waited for.
+        const pid_t own = fork();
+        if (own == 0) {
+            std::this_thread::sleep_for(std::chrono::milliseconds(100));
+            _exit(0);
+        }
+        for (int i = 0; i < 3; ++i) {
+            EXPECT_EQ(ORLICExec(kTool, "0", nullptr, nullptr, nullptr), 0) << s.szName;
+            EXPECT_EQ(ORLICExec(kTool, "3", nullptr, nullptr, nullptr), 3) << s.szName;
+            FILE *stream = ORLICPopen(kTool, "r", "5", "print", nullptr);
+            ASSERT_NE(stream, nullptr);
+            EXPECT_EQ(ReadAll(stream), "5\n") << s.szName;
+            EXPECT_EQ(ORLICPclose(stream), 5) << s.szName;
+        }
+        if (s.handler == SIG_DFL) {
+            EXPECT_EQ(waitpid(own, nullptr, 0), own) << s.szName;
+        }
+        if (s.bBlock) sigprocmask(SIG_SETMASK, &oldMask, nullptr);
+        sigaction(SIGCHLD, &old, nullptr);
+        if (s.handler != SIG_DFL && s.handler != SIG_IGN) {
+            EXPECT_EQ(handled, 1) << s.szName;
+        }
+        EXPECT_THAT(Descendants(), IsEmpty()) << s.szName;
+    }
+}
+
+TEST(RunnerStart, ProgramThatCannotBeStartedFailsAtOnceWithItsReason) {
+    errno = 0;
+    EXPECT_EQ(ORLICExec("/usr/bin/xavo-missing", nullptr, nullptr, nullptr, nullptr), -1);
+    EXPECT_EQ(errno, ENOENT);
+    EXPECT_EQ(ORLICErrGet(), 0x2A00u);
+    EXPECT_EQ(ORLICPopen("/usr/bin/xavo-missing", "r", nullptr), nullptr);
+    EXPECT_EQ(ORLICErrGet(), 0x2A00u);
+    EXPECT_THAT(Descendants(), IsEmpty());
+}
