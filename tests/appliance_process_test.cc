@@ -21,6 +21,7 @@
 #include "appliance/standin_control.h"
 #include "sandbox/sandbox.h"
 #include "support/logs.h"
+#include "support/processes.h"
 #include "xavocore.h"
 
 using ::testing::ElementsAre;
@@ -51,34 +52,6 @@ std::string ReadAll(FILE *stream) {
             return text;
         }
     }
-}
-
-// Whether a process of that id still runs (a zombie has ended).
-bool Running(pid_t pid) {
-    const std::string stat = ReadFile("/proc/" + std::to_string(pid) + "/stat");
-    const size_t close = stat.rfind(')');
-    return close != std::string::npos && close + 2 < stat.size() && stat[close + 2] != 'Z';
-}
-
-// Signals sent are taken a moment later: up to a second for the process to
-// end.
-bool EndsSoon(pid_t pid) {
-    for (int i = 0; i < 100 && Running(pid); ++i) std::this_thread::sleep_for(std::chrono::milliseconds(10));
-    return !Running(pid);
-}
-
-// Orphans of a stopped tool come to the sandbox's subreaper, as they come to
-// init on the appliance: reaped here as init would, then nothing may be
-// left.
-bool NothingLeft() {
-    for (int i = 0; i < 100; ++i) {
-        for (const SandboxProcess &p : Descendants()) {
-            if (p.state == 'Z') waitpid(p.pid, nullptr, WNOHANG);
-        }
-        if (Descendants().empty()) return true;
-        std::this_thread::sleep_for(std::chrono::milliseconds(10));
-    }
-    return false;
 }
 
 // Each way of running a program, reduced to "result, output read".

@@ -5,7 +5,10 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <chrono>
 #include <functional>
+#include <string>
+#include <thread>
 #include <vector>
 
 #include "sandbox/sandbox.h"
@@ -47,6 +50,35 @@ inline void RunAtOnce(int n, const std::function<bool(int)> &body) {
         EXPECT_EQ(waitpid(pid, &status, 0), pid);
         EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << "process " << pid;
     }
+}
+
+// Whether a process of that id still runs (a zombie has ended).
+inline bool Running(pid_t pid) {
+    const std::string stat = ReadFile("/proc/" + std::to_string(pid) + "/stat");
+    const size_t close = stat.rfind(')');
+    return close != std::string::npos && close + 2 < stat.size() && stat[close + 2] != 'Z';
+}
+
+// A signal sent is taken a moment later: up to a second for the process to
+// end.
+inline bool EndsSoon(pid_t pid) {
+    for (int i = 0; i < 100 && Running(pid); ++i) std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    return !Running(pid);
+}
+
+// Nothing started in the sandbox is left, zombies included, once the
+// orphans of stopped tools are reaped: those come to this process, the
+// sandbox's subreaper, as they come to init on the appliance, and are
+// reaped here as init would (up to a second for them to end).
+inline bool NothingLeft() {
+    for (int i = 0; i < 100; ++i) {
+        for (const SandboxProcess &p : Descendants()) {
+            if (p.state == 'Z') waitpid(p.pid, nullptr, WNOHANG);
+        }
+        if (Descendants().empty()) return true;
+        std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    }
+    return false;
 }
 
 }  // namespace xavo::test
