@@ -30,6 +30,12 @@ inline constexpr int32_t kSignalBase = 128;
 
 enum class Stdout { kInherit, kDiscard, kPipe };
 
+// The bytes the helper that runs a program (process_start.cc) and the
+// runner send each other over their pipes.
+inline constexpr char kNoteStarted = 's';  // helper: the program runs (or failed to start)
+inline constexpr char kNoteEnded = 'x';    // helper: the program has ended
+inline constexpr char kNoteRelease = 'g';  // runner: reap it and exit
+
 // How long szProgram may run before it is stopped (process_limits.cc).
 Clock::duration ToolTimeLimit(const char *szProgram);
 // Between SIGTERM and SIGKILL for a program past its limit: long enough for
@@ -76,7 +82,10 @@ public:
 
 private:
     enum class Woken { kReady, kTimeUp, kInterrupted };
+    struct ChildEnds;
     explicit Child(const char *szProgram);
+    bool OpenEnds(Stdout out, ChildEnds *pEnds);
+    bool MapBlock();
     bool Launched(const char *szProgram, const std::vector<std::string> &argv, Stdout out);
     Woken WaitReadable(int fd, Clock::time_point until, bool bInterruptible);
     void RelayStderr();
@@ -90,6 +99,7 @@ private:
     Clock::time_point deadline_;
     void *pBlock_ = nullptr;  // the Launch record and the stacks (mmap)
     size_t cbBlock_ = 0;
+    char *pHelperStack_ = nullptr;  // top of the helper's stack, in the block
     pid_t helper_ = -1;
     pid_t program_ = -1;
     xavo::platform::Fd out_, err_, report_, go_;

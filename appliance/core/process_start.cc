@@ -53,9 +53,6 @@ constexpr size_t kStackSize = 64 * 1024;
 // Where close_range() is missing (kernels before 5.9), descriptors are
 // closed one by one up to this.
 constexpr unsigned kMaxFdFallback = 65536;
-constexpr char kStarted = 's';  // helper to runner: the program runs (or failed to)
-constexpr char kEnded = 'x';    // helper to runner: the program has ended
-constexpr char kRelease = 'g';  // runner to helper: reap it and exit
 
 // The kernel's own sigaction record of rt_sigaction(), the same on i386
 // and x86_64; 8 bytes of signal set.
@@ -132,7 +129,7 @@ XAVO_RAW_CHILD int HelperMain(void *pArg) {
     // show when the program (and what it started) closes them.
     CloseRange(0, 2);
     l->program = program;
-    char note = kStarted;
+    char note = xavo::core::kNoteStarted;
     syscall(SYS_write, l->fdReport, &note, 1);
     if (program < 0) syscall(SYS_exit_group, 127);
     // The ended program stays a zombie until the runner releases it, so
@@ -140,7 +137,7 @@ XAVO_RAW_CHILD int HelperMain(void *pArg) {
     // signal it.
     siginfo_t info;
     syscall(SYS_waitid, P_PID, program, &info, WEXITED | WNOWAIT, nullptr);
-    note = kEnded;
+    note = xavo::core::kNoteEnded;
     syscall(SYS_write, l->fdReport, &note, 1);
     syscall(SYS_read, l->fdGo, &note, 1);
     int status = 0;
@@ -202,37 +199,49 @@ std::unique_ptr<Child> Child::Start(const char *szProgram, const std::vector<std
     return child;
 }
 
-bool Child::Launched(const char *szProgram, const std::vector<std::string> &argv, Stdout out) {
-    const Clock::time_point start = Clock::now();
-    const std::vector<char *> args = Pointers(argv);
-    const std::vector<std::string> env = ChildEnvironment();
-    const std::vector<char *> envp = Pointers(env);
-    Fd in, outWrite, errWrite, reportWrite, goRead;
-    if (!OpenNull(O_RDONLY, &in)) return false;
-    if (out == Stdout::kPipe ? !OpenPipe(&out_, &outWrite, true)
-                             : (out == Stdout::kDiscard || !IsOpen(1)) && !OpenNull(O_WRONLY, &outWrite)) {
+// The program's ends of its pipes and /dev/null, kept by the caller until
+// the helper has its copies.
+struct Child::ChildEnds {
+    Fd in, out, err, report, go;
+};
+
+bool Child::OpenEnds(Stdout out, ChildEnds *pEnds) {
+    if (!OpenNull(O_RDONLY, &pEnds->in)) return false;
+    if (out == Stdout::kPipe ? !OpenPipe(&out_, &pEnds->out, true)
+                             : (out == Stdout::kDiscard || !IsOpen(1)) && !OpenNull(O_WRONLY, &pEnds->out)) {
         return false;
     }
-    if (!OpenPipe(&err_, &errWrite, true) || !OpenPipe(&report_, &reportWrite, false) ||
-        !OpenPipe(&goRead, &go_, false)) {
-        return false;
-    }
+    return OpenPipe(&err_, &pEnds->err, true) && OpenPipe(&report_, &pEnds->report, false) &&
+           OpenPipe(&pEnds->go, &go_, false);
+}
+
+// [Launch][guard][helper's stack][guard][program's stack]: the guard pages
+// turn an overflow into a fault instead of a write into the other.
+bool Child::MapBlock() {
     const size_t page = static_cast<size_t>(sysconf(_SC_PAGESIZE));
-    // [Launch][guard][helper's stack][guard][program's stack]
     cbBlock_ = 3 * page + 2 * kStackSize;
     void *pBlock = mmap(nullptr, cbBlock_, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS | MAP_STACK, -1, 0);
     if (pBlock == MAP_FAILED) return false;
     pBlock_ = pBlock;
     char *base = static_cast<char *>(pBlock);
-    if (mprotect(base + page, page, PROT_NONE) != 0 || mprotect(base + 2 * page + kStackSize, page, PROT_NONE) != 0) {
-        return false;
-    }
-    Launch *l = new (base) Launch{szProgram, args.data(), envp.data(), in.get(), outWrite.get(), errWrite.get(),
-                                  reportWrite.get(), goRead.get(), base + cbBlock_, -1, 0};
+    pHelperStack_ = base + 2 * page + kStackSize;
+    return mprotect(base + page, page, PROT_NONE) == 0 && mprotect(pHelperStack_, page, PROT_NONE) == 0;
+}
+
+bool Child::Launched(const char *szProgram, const std::vector<std::string> &argv, Stdout out) {
+    const Clock::time_point start = Clock::now();
+    const std::vector<char *> args = Pointers(argv);
+    const std::vector<std::string> env = ChildEnvironment();
+    const std::vector<char *> envp = Pointers(env);
+    ChildEnds ends;
+    if (!OpenEnds(out, &ends) || !MapBlock()) return false;
+    char *base = static_cast<char *>(pBlock_);
+    Launch *l = new (base) Launch{szProgram, args.data(), envp.data(), ends.in.get(), ends.out.get(), ends.err.get(),
+                                  ends.report.get(), ends.go.get(), base + cbBlock_, -1, 0};
     sigset_t all, old;
     sigfillset(&all);
     pthread_sigmask(SIG_SETMASK, &all, &old);
-    helper_ = clone(HelperMain, base + 2 * page + kStackSize, CLONE_VM, l);
+    helper_ = clone(HelperMain, pHelperStack_, CLONE_VM, l);
     const int cloneError = errno;
     pthread_sigmask(SIG_SETMASK, &old, nullptr);
     if (helper_ < 0) {
@@ -241,7 +250,7 @@ bool Child::Launched(const char *szProgram, const std::vector<std::string> &argv
     }
     // The helper has its own copies; without ours, its end shows as the
     // end of the pipe.
-    reportWrite.reset();
+    ends.report.reset();
     char note = 0;
     ssize_t n;
     do {

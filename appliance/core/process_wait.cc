@@ -20,8 +20,6 @@
 namespace {
 
 constexpr char kLogStopped[] = "no exit within its time limit, stopped";
-constexpr char kEndedNote = 'x';
-constexpr char kRelease = 'g';
 constexpr size_t kReadChunk = 4096;
 // What is still read of a program's standard error once it has ended
 // (something it started may keep writing there).
@@ -145,7 +143,7 @@ void Child::TakeExitNote() {
     const ssize_t n = ::read(report_.get(), &note, 1);
     if (n < 0) return;  // EINTR: asked again
     exited_ = true;
-    lost_ = n == 0 || note != kEndedNote;
+    lost_ = n == 0 || note != kNoteEnded;
 }
 
 // The group and the program itself: a program may have moved to a group
@@ -175,7 +173,7 @@ int32_t Child::Finish() {
     DrainStderr();
     out_.reset();
     finished_ = true;
-    const char release = kRelease;
+    const char release = kNoteRelease;
     while (::write(go_.get(), &release, 1) < 0 && errno == EINTR) {
     }
     go_.reset();
