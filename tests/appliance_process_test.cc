@@ -9,7 +9,6 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <atomic>
 #include <cerrno>
 #include <chrono>
 #include <cstdio>
@@ -104,6 +103,22 @@ TEST(RunnerTimeLimit, EveryEntryPointStopsTheToolAndWhatItStartedAtTheLimit) {
         EXPECT_THAT(ProgramLogs(), ElementsAre("7 xavo-tool: no exit within its time limit, stopped")) << e.szName;
         EXPECT_TRUE(NothingLeft()) << e.szName;
     }
+    // The same for a caller that blocks every signal and ignores SIGCHLD.
+    {
+        SigchldScope ignored(kSigchldSettings[1]);
+        sigset_t all, old;
+        sigfillset(&all);
+        pthread_sigmask(SIG_SETMASK, &all, &old);
+        const auto start = std::chrono::steady_clock::now();
+        std::string out;
+        const int32_t result = kEntryPoints[3].run(&out);
+        const double seconds = Since(start);
+        pthread_sigmask(SIG_SETMASK, &old, nullptr);
+        EXPECT_EQ(result, -1);
+        EXPECT_LT(seconds, 1 + kSlack);
+        EXPECT_TRUE(EndsSoon(std::stoi(ReadFile("/tmp/helper.pid"))));
+    }
+    EXPECT_TRUE(NothingLeft());
     // SIGKILL after the grace, for a tool and a helper that ignore SIGTERM.
     PlaceProgram(kTool, NeverEnding(true));
     const auto start = std::chrono::steady_clock::now();
@@ -192,52 +207,21 @@ TEST(RunnerPatterns, OnlyTheSpoolPatternOfRmIsExpanded) {
 // blocks SIGCHLD gets each run's own result, and its handler is never run
 // for the runner's programs, only for its own children.
 TEST(RunnerSigchld, CallersHandlingOfSigchldNeverChangesAResult) {
-    static std::atomic<int> handled{0};
-    struct Setting {
-        const char *szName;
-        void (*handler)(int);
-        int flags;
-        bool bBlock;
-    } const settings[] = {
-        {"default", SIG_DFL, 0, false},
-        {"ignored", SIG_IGN, 0, false},
-        {"reaping handler", [](int) { ++handled; while (waitpid(-1, nullptr, WNOHANG) > 0) {} }, SA_RESTART, false},
-        {"reaping handler, no restart", [](int) { ++handled; while (waitpid(-1, nullptr, WNOHANG) > 0) {} }, 0, false},
-        {"blocked", SIG_DFL, 0, true},
-    };
     PlaceProgram(kTool, "#!/bin/sh\n[ -z \"$2\" ] || echo \"$1\"\nsleep 0.05\nexit \"$1\"\n");
-    for (const Setting &s : settings) {
-        struct sigaction sa {}, old {};
-        sa.sa_handler = s.handler;
-        sa.sa_flags = s.flags;
-        sigaction(SIGCHLD, &sa, &old);
-        sigset_t chld, oldMask;
-        sigemptyset(&chld);
-        sigaddset(&chld, SIGCHLD);
-        if (s.bBlock) sigprocmask(SIG_BLOCK, &chld, &oldMask);
-        handled = 0;
-        // A child of the caller's own ends while a run is waited for.
-        const pid_t own = fork();
-        if (own == 0) {
-            std::this_thread::sleep_for(std::chrono::milliseconds(100));
-            _exit(0);
+    for (const SigchldSetting &s : kSigchldSettings) {
+        {
+            SigchldScope scope(s);
+            for (int i = 0; i < 3; ++i) {
+                EXPECT_EQ(ORLICExec(kTool, "0", nullptr, nullptr, nullptr), 0) << s.szName;
+                EXPECT_EQ(ORLICExec(kTool, "3", nullptr, nullptr, nullptr), 3) << s.szName;
+                FILE *stream = ORLICPopen(kTool, "r", "5", "print", nullptr);
+                ASSERT_NE(stream, nullptr);
+                EXPECT_EQ(ReadAll(stream), "5\n") << s.szName;
+                EXPECT_EQ(ORLICPclose(stream), 5) << s.szName;
+            }
         }
-        for (int i = 0; i < 3; ++i) {
-            EXPECT_EQ(ORLICExec(kTool, "0", nullptr, nullptr, nullptr), 0) << s.szName;
-            EXPECT_EQ(ORLICExec(kTool, "3", nullptr, nullptr, nullptr), 3) << s.szName;
-            FILE *stream = ORLICPopen(kTool, "r", "5", "print", nullptr);
-            ASSERT_NE(stream, nullptr);
-            EXPECT_EQ(ReadAll(stream), "5\n") << s.szName;
-            EXPECT_EQ(ORLICPclose(stream), 5) << s.szName;
-        }
-        if (s.handler == SIG_DFL) {
-            EXPECT_EQ(waitpid(own, nullptr, 0), own) << s.szName;
-        }
-        if (s.bBlock) sigprocmask(SIG_SETMASK, &oldMask, nullptr);
-        sigaction(SIGCHLD, &old, nullptr);
-        if (s.handler != SIG_DFL && s.handler != SIG_IGN) {
-            EXPECT_EQ(handled, 1) << s.szName;
-        }
+        // Only for its own child.
+        EXPECT_EQ(gReapingHandlerCalls, s.handler == ReapEveryChild ? 1 : 0) << s.szName;
         EXPECT_THAT(Descendants(), IsEmpty()) << s.szName;
     }
 }

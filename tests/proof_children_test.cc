@@ -99,25 +99,6 @@ void RunMix(Tally *pTally, const std::string &setting) {
     }
 }
 
-struct SigchldSetting {
-    const char *szName;
-    void (*handler)(int);
-    int flags;
-    bool bBlocked;
-};
-void Reap(int) {
-    const int saved = errno;
-    while (waitpid(-1, nullptr, WNOHANG) > 0) {
-    }
-    errno = saved;
-}
-const SigchldSetting kSettings[] = {
-    {"SIGCHLD ignored", SIG_IGN, 0, false},
-    {"reaping SIGCHLD handler", Reap, SA_RESTART, false},
-    {"reaping SIGCHLD handler without SA_RESTART", Reap, 0, false},
-    {"SIGCHLD blocked", SIG_DFL, 0, true},
-};
-
 void DescriptorsAndLeftovers(Tally *pTally) {
     // Descriptors of the caller's of several kinds, with and without
     // close-on-exec.
@@ -137,27 +118,11 @@ void DescriptorsAndLeftovers(Tally *pTally) {
 }
 
 void SigchldSettings(Tally *pTally) {
-    for (const SigchldSetting &s : kSettings) {
-        struct sigaction sa {}, old {};
-        sa.sa_handler = s.handler;
-        sa.sa_flags = s.flags;
-        sigaction(SIGCHLD, &sa, &old);
-        sigset_t chld, oldMask;
-        sigemptyset(&chld);
-        sigaddset(&chld, SIGCHLD);
-        if (s.bBlocked) sigprocmask(SIG_BLOCK, &chld, &oldMask);
-        // A child of the caller's own ends in the middle of the mix.
-        const pid_t own = fork();
-        if (own == 0) {
-            std::this_thread::sleep_for(std::chrono::milliseconds(30));
-            _exit(0);
+    for (const SigchldSetting &s : kSigchldSettings) {
+        {
+            SigchldScope scope(s);
+            for (int round = 0; round < 3; ++round) RunMix(pTally, s.szName);
         }
-        for (int round = 0; round < 3; ++round) RunMix(pTally, s.szName);
-        if (s.bBlocked) {
-            waitpid(own, nullptr, 0);
-            sigprocmask(SIG_SETMASK, &oldMask, nullptr);
-        }
-        sigaction(SIGCHLD, &old, nullptr);
         pTally->Check(NothingLeft(), std::string(s.szName) + ": a process or zombie left");
     }
 }
