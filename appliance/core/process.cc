@@ -47,9 +47,9 @@ constexpr char kUnit[] = "process";
 
 // ORLICExecl's option word.  0x01: wait for the program and return its
 // result (without it the program is started, 0 returned, and the program
-// reaped in the background).  0x02: the program's standard output goes to
-// /dev/null.  Other bits are reserved and ignored (0xBB = wait, discard
-// output, plus reserved bits).
+// waited for in the background, within its time limit all the same).
+// 0x02: the program's standard output goes to /dev/null.  Other bits are
+// reserved and ignored (0xBB = wait, discard output, plus reserved bits).
 constexpr uint32_t kExeclWait = 0x01;
 constexpr uint32_t kExeclQuiet = 0x02;
 
