@@ -40,7 +40,7 @@
 extern "C" {
 #endif
 
-/* Forgets every counter and failure rule. */
+/* Forgets every counter and failure rule, and the time limit below. */
 void XavoStandinReset(void);
 
 /* Makes the nth call (1-based, counted from this moment) of the operation
@@ -60,6 +60,12 @@ int32_t XavoStandinCallCount(const char *szOp);
 /* The operation whose call was failed most recently by a rule since the
  * last reset, or NULL when no rule has fired. */
 const char *XavoStandinLastFailed(void);
+
+/* Every program the platform runs is stopped when it has run iSeconds
+ * (instead of its own limit, at most 300 s), so that a test of a tool that
+ * never exits does not wait minutes; 0 gives every program its own limit
+ * again. */
+void XavoStandinSetToolTimeLimit(int32_t iSeconds);
 
 #ifdef __cplusplus
 }

@@ -226,3 +226,18 @@ TEST_F(CupsQueues, SchedulerFileLosesExactlyTheUsbBlocksWhileStopped) {
     Cupsd::Start();
     EXPECT_EQ(Tool({"/usr/bin/lpstat", "-v"}), "device for usbprinter12: socket://10.0.0.12/\n");
 }
+
+// A USB printer's ID holds the serial number the printer reports: text the
+// printer controls, which never becomes a file name pattern.  Whether the
+// ID's own copy is kept or refused, SN0001's copy stays as it was.
+TEST_F(CupsQueues, PrinterIdHoldingPatternCharactersNeverReachesAnotherPrintersPpd) {
+    const char *szId = "04b8:0005:SN*";
+    const std::string kept = std::string("/etc/cups/ppd/") + kA + ".ppd";
+    PlaceFile(kept, "OTHER PRINTER");
+    PlaceFile("/tmp/new.ppd", kPpdText);
+    PlaceFile(kConf, ReadFile(kConf) + "\n[" + szId + "]\n\tproducer = ACME\n");
+    XAVOPrinterCupsAdd(szId, "/tmp/new.ppd");
+    EXPECT_EQ(ReadFile(kept), "OTHER PRINTER");
+    const std::string own = std::string("/etc/cups/ppd/") + szId + ".ppd";
+    EXPECT_TRUE(!FileExists(own) || ReadFile(own) == kPpdText);
+}

@@ -149,7 +149,8 @@ TEST_F(JobWaitListing, AnswersWhetherTheJobIsListed) {
 }
 
 // Catches SIGUSR1 without SA_RESTART, so that a read blocked when it
-// arrives fails with EINTR; the fake lpq sends it to its parent.
+// arrives fails with EINTR; the fake lpq sends it to the test (not to its
+// parent, which is the platform's helper that waits for it).
 struct InterruptibleReads {
     InterruptibleReads() {
         struct sigaction sa {};
@@ -168,7 +169,7 @@ void PlaceInterruptingLpq(int iInterruptedRuns) {
                                  "echo run >> /tmp/lpq.calls\n"
                                  "printf 'usbprinter1 is ready\\n'\n"
                                  "if [ $(wc -l < /tmp/lpq.calls) -le " + std::to_string(iInterruptedRuns) + " ]; then\n"
-                                 "  for i in 1 2 3; do sleep 0.2; kill -USR1 $PPID; done\n"
+                                 "  for i in 1 2 3; do sleep 0.2; kill -USR1 " + std::to_string(getpid()) + "; done\n"
                                  "  printf '1st root 42 late.pdf 1 bytes\\n'\n"
                                  "fi\n"
                                  "printf 'no entries\\n'\n");

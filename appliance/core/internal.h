@@ -13,10 +13,13 @@ namespace xavo::core {
 // Closes every named lock this process holds (the test controls' reset).
 void ReleaseNamedLocks();
 
-// Runs a program with the given arguments (argv[0] first) and waits for it.
-// The result: the exit status (0 to 255), 128 + N when signal N killed it,
-// or -1 when it could not be started or waited for (*pFailure then says
-// where).
+// Gives every program its own time limit again (the test controls' reset).
+void ResetToolTimeLimit();
+
+// Runs a program with the given arguments (argv[0] first) and waits for it,
+// at most its time limit.  The result: the exit status (0 to 255), 128 + N
+// when signal N killed it, or -1 when it could not be started, was stopped
+// at its limit or could not be waited for (*pFailure then says where).
 int32_t RunAndWait(const char *szProgram, const std::vector<std::string> &argv, xavo::platform::Failure *pFailure);
 
 // True when a live (not zombie) process has the given name as its command

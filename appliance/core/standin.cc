@@ -126,6 +126,7 @@ XAVO_PLATFORM_API int32_t XavoStandinEnter(const char *szOp, int32_t blCanFail, 
 // taken by one test (its unlock failed on purpose) does not outlive it.
 XAVO_PLATFORM_API void XavoStandinReset(void) {
     xavo::core::ReleaseNamedLocks();
+    xavo::core::ResetToolTimeLimit();
     Control &c = State();
     std::lock_guard lock(c.mutex);
     for (Counter &counter : c.counters) counter.calls.store(0, std::memory_order_relaxed);

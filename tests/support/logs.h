@@ -17,10 +17,33 @@ inline std::string NormaliseLogLine(const LogLine &line) {
                                                                     std::regex_constants::format_first_only);
 }
 
-// Every line logged since the last call, normalised.
+// The library's own lines: every log format of the library begins with the
+// "unit:line " of the source unit that logs.  The rest of what reaches the
+// sandbox's syslog is other programs' to word: the daemons a test starts,
+// and the tools' standard error, which the platform relays at debug
+// priority as "tool: text" (see ProgramLogs()).
+inline bool IsLibraryLine(const LogLine &line) {
+    static const std::regex kUnitLine("^[a-z_]+:[0-9]+ ");
+    return std::regex_search(line.message, kUnitLine);
+}
+
+// The library's lines logged since the last call, normalised; the others
+// are dropped.
 inline std::vector<std::string> Logs() {
     std::vector<std::string> out;
-    for (const LogLine &line : TakeLogs()) out.push_back(NormaliseLogLine(line));
+    for (const LogLine &line : TakeLogs()) {
+        if (IsLibraryLine(line)) out.push_back(NormaliseLogLine(line));
+    }
+    return out;
+}
+
+// The other lines logged since the last call ("7 lpstat: No destinations
+// added."); the library's are dropped.
+inline std::vector<std::string> ProgramLogs() {
+    std::vector<std::string> out;
+    for (const LogLine &line : TakeLogs()) {
+        if (!IsLibraryLine(line)) out.push_back(NormaliseLogLine(line));
+    }
     return out;
 }
 

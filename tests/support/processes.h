@@ -2,9 +2,12 @@
 #pragma once
 
 #include <gtest/gtest.h>
+#include <signal.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <atomic>
+#include <cerrno>
 #include <chrono>
 #include <functional>
 #include <string>
@@ -61,5 +64,94 @@ inline void AwaitCommandName(pid_t pid, const std::string &name) {
         std::this_thread::sleep_for(std::chrono::milliseconds(5));
     }
 }
+
+// Whether a process of that id still runs (a zombie has ended).
+inline bool Running(pid_t pid) {
+    const std::string stat = ReadFile("/proc/" + std::to_string(pid) + "/stat");
+    const size_t close = stat.rfind(')');
+    return close != std::string::npos && close + 2 < stat.size() && stat[close + 2] != 'Z';
+}
+
+// A signal sent is taken a moment later: up to a second for the process to
+// end.
+inline bool EndsSoon(pid_t pid) {
+    for (int i = 0; i < 100 && Running(pid); ++i) std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    return !Running(pid);
+}
+
+// Nothing started in the sandbox is left, zombies included, once the
+// orphans of stopped tools are reaped: those come to this process, the
+// sandbox's subreaper, as they come to init on the appliance, and are
+// reaped here as init would (up to a second for them to end).
+inline bool NothingLeft() {
+    for (int i = 0; i < 100; ++i) {
+        for (const SandboxProcess &p : Descendants()) {
+            if (p.state == 'Z') waitpid(p.pid, nullptr, WNOHANG);
+        }
+        if (Descendants().empty()) return true;
+        std::this_thread::sleep_for(std::chrono::milliseconds(10));
+    }
+    return false;
+}
+
+// The ways a service may handle SIGCHLD, which must never change what the
+// platform's runs answer.
+inline std::atomic<int> gReapingHandlerCalls{0};
+inline void ReapEveryChild(int) {
+    ++gReapingHandlerCalls;
+    const int saved = errno;
+    while (waitpid(-1, nullptr, WNOHANG) > 0) {
+    }
+    errno = saved;
+}
+struct SigchldSetting {
+    const char *szName;
+    void (*handler)(int);
+    int flags;
+    bool bBlocked;
+};
+inline const SigchldSetting kSigchldSettings[] = {
+    {"SIGCHLD default", SIG_DFL, 0, false},
+    {"SIGCHLD ignored", SIG_IGN, 0, false},
+    {"reaping SIGCHLD handler", ReapEveryChild, SA_RESTART, false},
+    {"reaping SIGCHLD handler without SA_RESTART", ReapEveryChild, 0, false},
+    {"SIGCHLD blocked", SIG_DFL, 0, true},
+};
+
+// Holds a setting for its lifetime, with a child of the caller's own that
+// ends a moment after the start, while the runs under test wait; reaped on
+// the way out where the setting leaves that to the caller.
+class SigchldScope {
+public:
+    explicit SigchldScope(const SigchldSetting &setting) : setting_(setting) {
+        struct sigaction sa {};
+        sa.sa_handler = setting.handler;
+        sa.sa_flags = setting.flags;
+        sigaction(SIGCHLD, &sa, &old_);
+        sigset_t chld;
+        sigemptyset(&chld);
+        sigaddset(&chld, SIGCHLD);
+        if (setting.bBlocked) sigprocmask(SIG_BLOCK, &chld, &oldMask_);
+        gReapingHandlerCalls = 0;
+        own_ = fork();
+        if (own_ == 0) {
+            std::this_thread::sleep_for(std::chrono::milliseconds(50));
+            _exit(0);
+        }
+    }
+    SigchldScope(const SigchldScope &) = delete;
+    SigchldScope &operator=(const SigchldScope &) = delete;
+    ~SigchldScope() {
+        if (setting_.handler == SIG_DFL) waitpid(own_, nullptr, 0);
+        if (setting_.bBlocked) sigprocmask(SIG_SETMASK, &oldMask_, nullptr);
+        sigaction(SIGCHLD, &old_, nullptr);
+    }
+
+private:
+    const SigchldSetting &setting_;
+    struct sigaction old_ {};
+    sigset_t oldMask_{};
+    pid_t own_ = -1;
+};
 
 }  // namespace xavo::test

@@ -1,0 +1,228 @@
+// The platform stand-in's process runner, driven directly: every program
+// run ends within its time limit together with what it started, the
+// programs' standard error goes to syslog instead of the caller's terminal,
+// only the appliance's own file name pattern is expanded, and a caller's
+// SIGCHLD handling never changes a result.
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <chrono>
+#include <cstdio>
+#include <functional>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "appliance/standin_control.h"
+#include "sandbox/sandbox.h"
+#include "support/logs.h"
+#include "support/processes.h"
+#include "xavocore.h"
+
+using ::testing::ElementsAre;
+using ::testing::IsEmpty;
+using namespace xavo::test;
+
+namespace {
+
+constexpr char kTool[] = "/usr/bin/xavo-tool";
+constexpr double kSlack = 1.5;  // a loaded machine's delay on top
+
+double Since(std::chrono::steady_clock::time_point start) {
+    return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
+}
+
+// All of a stream; a read that a signal interrupted is taken again.
+std::string ReadAll(FILE *stream) {
+    std::string text;
+    for (;;) {
+        errno = 0;
+        const int ch = std::fgetc(stream);
+        if (ch != EOF) {
+            text += static_cast<char>(ch);
+        } else if (errno == EINTR) {
+            std::clearerr(stream);
+        } else {
+            return text;
+        }
+    }
+}
+
+// Each way of running a program, reduced to "result, output read".
+struct EntryPoint {
+    const char *szName;
+    std::function<int32_t(std::string *)> run;
+};
+const EntryPoint kEntryPoints[] = {
+    {"ORLICExec", [](std::string *) { return ORLICExec(kTool, "a", nullptr, nullptr, nullptr); }},
+    {"ORLICExecl", [](std::string *) { return ORLICExecl(kTool, 0xBB, "a", nullptr); }},
+    {"ORLICExecv",
+     [](std::string *) {
+         char *const argv[] = {const_cast<char *>(kTool), const_cast<char *>("a"), nullptr};
+         return ORLICExecv(kTool, argv, 1);
+     }},
+    {"ORLICPopen",
+     [](std::string *pOut) {
+         FILE *stream = ORLICPopen(kTool, "r", "a", nullptr);
+         if (stream == nullptr) return int32_t{-100};
+         *pOut = ReadAll(stream);
+         return ORLICPclose(stream);
+     }},
+};
+
+// A tool that prints a line, starts a helper of its own that never ends,
+// and never ends either.
+constexpr char kNeverEnding[] =
+    "#!/bin/sh\necho started\nsleep 1000 &\necho $! > /tmp/helper.pid\nwhile :; do sleep 1; done\n";
+
+}  // namespace
+
+TEST(RunnerTimeLimit, EveryEntryPointStopsTheToolAndWhatItStartedAtTheLimit) {
+    XavoStandinSetToolTimeLimit(1);
+    for (const EntryPoint &e : kEntryPoints) {
+        PlaceProgram(kTool, kNeverEnding);
+        ORLICErrSetEx(0, "", 0);
+        std::string out;
+        const auto start = std::chrono::steady_clock::now();
+        EXPECT_EQ(e.run(&out), -1) << e.szName;
+        const double seconds = Since(start);
+        EXPECT_GE(seconds, 0.9) << e.szName;
+        EXPECT_LT(seconds, 1 + kSlack) << e.szName << ": the tool ends at SIGTERM";
+        EXPECT_EQ(ORLICErrGet(), 0x2A00u) << e.szName;
+        if (std::string(e.szName) == "ORLICPopen") {
+            EXPECT_EQ(out, "started\n");
+        }
+        EXPECT_TRUE(EndsSoon(std::stoi(ReadFile("/tmp/helper.pid")))) << e.szName << ": its group is stopped";
+        EXPECT_THAT(ProgramLogs(), ElementsAre("7 xavo-tool: no exit within its time limit, stopped")) << e.szName;
+        EXPECT_TRUE(NothingLeft()) << e.szName;
+    }
+    // The same for a caller that blocks every signal and ignores SIGCHLD.
+    {
+        SigchldScope ignored(kSigchldSettings[1]);
+        sigset_t all, old;
+        sigfillset(&all);
+        pthread_sigmask(SIG_SETMASK, &all, &old);
+        const auto start = std::chrono::steady_clock::now();
+        std::string out;
+        const int32_t result = kEntryPoints[3].run(&out);
+        const double seconds = Since(start);
+        pthread_sigmask(SIG_SETMASK, &old, nullptr);
+        EXPECT_EQ(result, -1);
+        EXPECT_LT(seconds, 1 + kSlack);
+        EXPECT_TRUE(EndsSoon(std::stoi(ReadFile("/tmp/helper.pid"))));
+    }
+    EXPECT_TRUE(NothingLeft());
+    // 0 gives every tool its own limit again (more than 1.2 s).  The
+    // SIGKILL after the grace, for a tool that ignores SIGTERM, is proven by
+    // the proof suite of child hygiene.
+    PlaceProgram(kTool, "#!/bin/sh\nsleep 1.2\n");
+    XavoStandinSetToolTimeLimit(0);
+    EXPECT_EQ(ORLICExec(kTool, nullptr, nullptr, nullptr, nullptr), 0);
+}
+
+TEST(RunnerStderr, LinesGoToSyslogTaggedWithTheToolNeverToTheCallersStderr) {
+    PlaceProgram(kTool, "#!/bin/sh\n"
+                        "echo 'first line' >&2\n"
+                        "echo 'xavo-tool: tagged already' >&2\n"
+                        "printf 'colour \\033[31mred\\r\\n\\n' >&2\n"
+                        "head -c 1500 /dev/zero | tr '\\0' a >&2\n"
+                        "echo out\n"
+                        "printf 'no newline' >&2\n"
+                        "exit 3\n");
+    const std::vector<std::string> expected = {
+        "7 xavo-tool: first line", "7 xavo-tool: tagged already", "7 xavo-tool: colour ?[31mred",
+        "7 xavo-tool: " + std::string(1024, 'a'), "7 xavo-tool: " + std::string(1500 - 1024, 'a') + "no newline"};
+    // The caller's descriptor 2 becomes a file for the time of the calls.
+    FILE *pCaught = std::tmpfile();
+    ASSERT_NE(pCaught, nullptr);
+    const int savedStderr = dup(2);
+    dup2(fileno(pCaught), 2);
+    const int32_t iExec = ORLICExec(kTool, nullptr, nullptr, nullptr, nullptr);
+    const std::vector<std::string> execLines = ProgramLogs();
+    FILE *stream = ORLICPopen(kTool, "r", nullptr);
+    const std::string out = stream != nullptr ? ReadAll(stream) : "";
+    const int32_t iClosed = stream != nullptr ? ORLICPclose(stream) : -100;
+    dup2(savedStderr, 2);
+    close(savedStderr);
+    EXPECT_EQ(iExec, 3);
+    EXPECT_EQ(execLines, expected);
+    EXPECT_EQ(out, "out\n");
+    EXPECT_EQ(iClosed, 3);
+    EXPECT_EQ(ProgramLogs(), expected);
+    EXPECT_EQ(std::ftell(pCaught), 0) << "nothing on the caller's stderr";
+    std::fclose(pCaught);
+
+    // Far more than a pipe holds, while the caller waits or reads: relayed
+    // as it comes, so the tool never blocks on it.
+    PlaceProgram(kTool, "#!/bin/sh\nseq 1 20000 | sed 's/^/line /' >&2\necho done\n");
+    XavoStandinSetToolTimeLimit(20);
+    EXPECT_EQ(ORLICExec(kTool, nullptr, nullptr, nullptr, nullptr), 0);
+    stream = ORLICPopen(kTool, "r", nullptr);
+    ASSERT_NE(stream, nullptr);
+    EXPECT_EQ(ReadAll(stream), "done\n");
+    EXPECT_EQ(ORLICPclose(stream), 0);
+    const std::vector<std::string> lines = ProgramLogs();
+    ASSERT_EQ(lines.size(), 40000u);
+    EXPECT_EQ(lines[19999], "7 xavo-tool: line 20000");
+}
+
+// Only "/var/services/printer/*.*" given to /bin/rm is a pattern; any other
+// argument is a name, whatever characters it holds.
+TEST(RunnerPatterns, OnlyTheSpoolPatternOfRmIsExpanded) {
+    for (const char *name : {"/tmp/p/a1", "/tmp/p/a2", "/tmp/src", "/var/services/printer/job.pdf",
+                             "/var/services/printer/nodot", "/var/services/printer/.hidden"}) {
+        PlaceFile(name, name);
+    }
+    EXPECT_EQ(ORLICExec("/bin/cp", "-f", "/tmp/src", "/tmp/p/a*", nullptr), 0);
+    EXPECT_EQ(ReadFile("/tmp/p/a*"), "/tmp/src") << "a new file of that very name";
+    EXPECT_EQ(ReadFile("/tmp/p/a1"), "/tmp/p/a1");
+    EXPECT_EQ(ORLICExec("/bin/rm", "-f", "/tmp/p/a?", "/tmp/p/[a]2", nullptr), 0);
+    EXPECT_TRUE(FileExists("/tmp/p/a1") && FileExists("/tmp/p/a2"));
+    EXPECT_EQ(ORLICExec("/bin/cp", "/var/services/printer/*.*", "/tmp/p/", nullptr, nullptr), 1)
+        << "no file of that name: cp fails";
+    EXPECT_TRUE(FileExists("/var/services/printer/job.pdf"));
+
+    EXPECT_EQ(ORLICExec("/bin/rm", "-rf", "/var/services/printer/*.*", nullptr, nullptr), 0);
+    EXPECT_FALSE(FileExists("/var/services/printer/job.pdf"));
+    EXPECT_TRUE(FileExists("/var/services/printer/nodot"));
+    EXPECT_TRUE(FileExists("/var/services/printer/.hidden"));
+    EXPECT_EQ(ORLICExec("/bin/rm", "-rf", "/var/services/printer/*.*", nullptr, nullptr), 0)
+        << "nothing matches: rm -f of the pattern's own name";
+}
+
+// A caller that ignores SIGCHLD, reaps every child in its handler, or
+// blocks SIGCHLD gets each run's own result, and its handler is never run
+// for the runner's programs, only for its own children.
+TEST(RunnerSigchld, CallersHandlingOfSigchldNeverChangesAResult) {
+    PlaceProgram(kTool, "#!/bin/sh\n[ -z \"$2\" ] || echo \"$1\"\nsleep 0.05\nexit \"$1\"\n");
+    for (const SigchldSetting &s : kSigchldSettings) {
+        {
+            SigchldScope scope(s);
+            for (int i = 0; i < 3; ++i) {
+                EXPECT_EQ(ORLICExec(kTool, "0", nullptr, nullptr, nullptr), 0) << s.szName;
+                EXPECT_EQ(ORLICExec(kTool, "3", nullptr, nullptr, nullptr), 3) << s.szName;
+                FILE *stream = ORLICPopen(kTool, "r", "5", "print", nullptr);
+                ASSERT_NE(stream, nullptr);
+                EXPECT_EQ(ReadAll(stream), "5\n") << s.szName;
+                EXPECT_EQ(ORLICPclose(stream), 5) << s.szName;
+            }
+        }
+        // Only for its own child.
+        EXPECT_EQ(gReapingHandlerCalls, s.handler == ReapEveryChild ? 1 : 0) << s.szName;
+        EXPECT_THAT(Descendants(), IsEmpty()) << s.szName;
+    }
+}
+
+TEST(RunnerStart, ProgramThatCannotBeStartedFailsAtOnceWithItsReason) {
+    errno = 0;
+    EXPECT_EQ(ORLICExec("/usr/bin/xavo-missing", nullptr, nullptr, nullptr, nullptr), -1);
+    EXPECT_EQ(errno, ENOENT);
+    EXPECT_EQ(ORLICErrGet(), 0x2A00u);
+    EXPECT_EQ(ORLICPopen("/usr/bin/xavo-missing", "r", nullptr), nullptr);
+    EXPECT_EQ(ORLICErrGet(), 0x2A00u);
+    EXPECT_THAT(Descendants(), IsEmpty());
+}

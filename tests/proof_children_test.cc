@@ -1,0 +1,169 @@
+// Proof of child hygiene, through the library's own operations with fake
+// tools at the paths the library runs (each run by a different entry point
+// of the platform's runner): no descriptor of the caller's reaches a tool,
+// nothing is left behind, a caller's SIGCHLD handling never changes a
+// result, and a tool that never exits is stopped within its limit.
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <signal.h>
+#include <sys/socket.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <chrono>
+#include <cstdio>
+#include <cstring>
+#include <functional>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "appliance/standin_control.h"
+#include "sandbox/sandbox.h"
+#include "support/processes.h"
+#include "xavocore.h"
+#include "xavoprinter.h"
+
+using namespace xavo::test;
+
+namespace {
+
+constexpr char kPrinter[] = "04b8:0005:SN0001";
+constexpr double kGrace = 2.0;  // the runner's SIGTERM-to-SIGKILL grace
+constexpr double kSlack = 1.5;  // a loaded machine's delay on top
+
+struct Tally {
+    int tried = 0;
+    int failed = 0;
+    void Check(bool bOk, const std::string &what) {
+        ++tried;
+        if (!bOk) {
+            ++failed;
+            ADD_FAILURE() << what;
+        }
+    }
+};
+
+// Every fake tool first writes down the descriptors it was given (ls adds
+// its own 3, the directory it lists).
+void PlaceTool(const char *szPath, const std::string &body) {
+    const std::string name = std::strrchr(szPath, '/') + 1;
+    PlaceProgram(szPath, "#!/bin/sh\nls /proc/self/fd > /tmp/fds." + name + "\n" + body);
+}
+
+struct Operation {
+    const char *szName;
+    const char *szTool;  // the program it runs, and how
+    std::function<int32_t()> call;
+};
+// One run of each entry point of the runner, and each answer told apart.
+const Operation kOperations[] = {
+    {"XAVOPrinterNetGetStringId", "/usr/bin/snmpwalk",
+     [] {
+         char szId[64] = {};
+         const int32_t r = XAVOPrinterNetGetStringId("10.0.0.1", szId, sizeof szId);
+         return r * 10 + (std::strcmp(szId, "MFG:ACME;MDL:X;") == 0 ? 1 : 0);
+     }},  // ORLICPopen
+    {"XAVOPrinterNetPingStatus", "/bin/ping",  // ORLICPopen
+     [] {
+         char szStatus[16] = {};
+         const int32_t r = XAVOPrinterNetPingStatus("10.0.0.1", szStatus, sizeof szStatus);
+         return r * 10 + (std::strcmp(szStatus, "Online") == 0 ? 1 : 0);
+     }},
+    {"XAVOPrinterUsbipEject", "/usr/bin/bind_driver", [] { return XAVOPrinterUsbipEject(kPrinter); }},  // ORLICExec
+    {"XAVOPrinterUsbipLockRelease", "/usr/bin/bind_driver",
+     [] { return XAVOPrinterUsbipLockRelease("failing"); }},  // ORLICExecl
+    {"XAVOPrinterCupsPrintFile", "/usr/bin/lpr",
+     [] { return XAVOPrinterCupsPrintFile(kPrinter, "/tmp/doc.txt", "doc", 0); }},  // ORLICExecv
+    {"XAVOPrinterCleanSpool", "/usr/bin/lprm", [] { return XAVOPrinterCleanSpool(); }},
+};
+// What each answers with the tools below: the ID read, online, ejected,
+// release refused by the tool, printed, spool emptied.
+const std::vector<int32_t> kAnswers = {1, 1, 0, -1, 0, 0};
+
+void PlaceTools() {
+    PlaceTool("/usr/bin/snmpwalk", "echo 'x = STRING: \"MFG:ACME;MDL:X;\"'\n");
+    PlaceTool("/bin/ping", "echo '1 packets transmitted, 1 received, 0% packet loss, time 0ms'\n");
+    PlaceTool("/usr/bin/bind_driver", "[ \"$2\" = failing ] && exit 1\nexit 0\n");
+    PlaceTool("/usr/bin/lpr", "exit 0\n");
+    PlaceTool("/usr/bin/lprm", "exit 0\n");
+    PlaceFile("/usr/xavo/etc/printer.conf", std::string("[") + kPrinter + "]\n\tcups printer name = usbprinter1\n");
+    PlaceFile("/tmp/doc.txt", "text\n");
+}
+
+// Runs the mix once; every answer checked.
+void RunMix(Tally *pTally, const std::string &setting) {
+    for (size_t i = 0; i < std::size(kOperations); ++i) {
+        const int32_t r = kOperations[i].call();
+        pTally->Check(r == kAnswers[i], setting + ": " + kOperations[i].szName + " answered " + std::to_string(r));
+    }
+}
+
+void DescriptorsAndLeftovers(Tally *pTally) {
+    // Descriptors of the caller's of several kinds, with and without
+    // close-on-exec.
+    const int plain = open("/dev/null", O_RDONLY);
+    const int cloexec = open("/dev/null", O_RDONLY | O_CLOEXEC);
+    int ends[2] = {-1, -1};
+    pTally->Check(pipe(ends) == 0 && plain >= 0 && cloexec >= 0, "the caller's descriptors");
+    const int sock = socket(AF_UNIX, SOCK_STREAM, 0);
+    RunMix(pTally, "default");
+    for (const Operation &op : kOperations) {
+        const std::string name = std::strrchr(op.szTool, '/') + 1;
+        const std::string fds = ReadFile("/tmp/fds." + name);
+        pTally->Check(fds == "0\n1\n2\n3\n", name + " was given descriptors " + fds);
+    }
+    for (int fd : {plain, cloexec, ends[0], ends[1], sock}) close(fd);
+    pTally->Check(Descendants().empty(), "a process or zombie left after the mix");
+}
+
+void SigchldSettings(Tally *pTally) {
+    for (const SigchldSetting &s : kSigchldSettings) {
+        {
+            SigchldScope scope(s);
+            for (int round = 0; round < 3; ++round) RunMix(pTally, s.szName);
+        }
+        pTally->Check(NothingLeft(), std::string(s.szName) + ": a process or zombie left");
+    }
+}
+
+// A call whose tool never exits returns within the tool's limit and the
+// grace, and the tool's process group is gone.
+void Bounded(Tally *pTally) {
+    XavoStandinSetToolTimeLimit(1);
+    // lprm and what it starts ignore SIGTERM: SIGKILL after the grace; the
+    // spool cleaning goes on as after any failed lprm.
+    PlaceTool("/usr/bin/lprm", "trap '' TERM\nsleep 1000 &\necho $! > /tmp/lprm.child\nwhile :; do sleep 1; done\n");
+    auto start = std::chrono::steady_clock::now();
+    const int32_t cleaned = XAVOPrinterCleanSpool();
+    double seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
+    pTally->Check(cleaned == 0, "the spool cleaning answered " + std::to_string(cleaned));
+    pTally->Check(seconds >= 1 + kGrace - 0.2 && seconds < 1 + kGrace + kSlack,
+                  "the spool cleaning took " + std::to_string(seconds) + " s");
+    pTally->Check(EndsSoon(std::stoi(ReadFile("/tmp/lprm.child"))), "lprm's own child still runs");
+    pTally->Check(NothingLeft(), "lprm: a process or zombie left");
+
+    // An SNMP walk that never ends: the listing ends at the limit, without
+    // an ID.
+    PlaceTool("/usr/bin/snmpwalk", "exec sleep 1000\n");
+    start = std::chrono::steady_clock::now();
+    char szId[64] = {};
+    const int32_t found = XAVOPrinterNetGetStringId("10.0.0.1", szId, sizeof szId);
+    seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
+    pTally->Check(found != 0 && szId[0] == '\0', "the walk answered " + std::to_string(found) + " " + szId);
+    pTally->Check(seconds >= 0.9 && seconds < 1 + kSlack, "the walk took " + std::to_string(seconds) + " s");
+    pTally->Check(NothingLeft(), "snmpwalk: a process or zombie left");
+    XavoStandinSetToolTimeLimit(0);
+}
+
+}  // namespace
+
+TEST(ProofChildren, ChildHygiene) {
+    PlaceTools();
+    Tally tally;
+    DescriptorsAndLeftovers(&tally);
+    SigchldSettings(&tally);
+    Bounded(&tally);
+    std::printf("child hygiene: %d tried, %d failed\n", tally.tried, tally.failed);
+    EXPECT_EQ(tally.failed, 0);
+}
