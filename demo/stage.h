@@ -1,8 +1,15 @@
 // The appliance the walk-through runs on: its printers and the peers that
-// stand for them inside the sandbox.
+// stand for them inside the sandbox, each started by the Stage and stopped
+// by its own pid when the Stage goes (cupsd by main(), after the walk).
 #pragma once
 
 #include <cstdint>
+#include <string>
+
+#include "sandbox/avahi.h"
+#include "sandbox/ipp_printer.h"
+#include "sandbox/snmpd.h"
+#include "sandbox/socket_listener.h"
 
 namespace xavo::demo {
 
@@ -26,8 +33,40 @@ inline constexpr std::uint16_t kNetPort = 9100;
 inline constexpr char kNetDeviceId[] = "MFG:ACME;MDL:Laser 5;CMD:PCL,POSTSCRIPT;CLS:PRINTER;";
 inline constexpr char kNetUri[] = "socket://127.0.0.1:9100";
 inline constexpr char kNetQueueName[] = "office";
+// The printer that answers no SNMP and announces itself by mDNS only.
+inline constexpr const char *kMdnsIp = xavo::test::IppPrinter::kIpv4;
+inline constexpr char kMdnsQueueName[] = "reception";
+// An address where nothing answers: SNMP, mDNS and BJNP all come back empty.
+inline constexpr char kNobodyIp[] = "127.0.0.3";
+// Debian's BJNP backend, run by the library as it is.
+inline constexpr char kBjnpBackend[] = "/usr/lib/cups/backend/bjnp";
+
 // Starts cupsd, plugs the USB printer in and places what the peers' clients
-// need.
+// need; before the Stage.
 void SetTheStage();
+
+class Stage {
+public:
+    Stage();
+    Stage(const Stage &) = delete;
+    Stage &operator=(const Stage &) = delete;
+
+    // Every peer runs; otherwise what is missing, in words.
+    std::string Missing() const;
+    // The documents the network printers received: everything sent to the
+    // socket printer; the first document the IPP printer kept.
+    std::string SocketPrinterGot(size_t size, int timeoutMs) { return socketPrinter_.WaitForBytes(size, timeoutMs); }
+    static std::string IppPrinterGot(size_t size, int timeoutMs) {
+        return xavo::test::IppPrinter::WaitForDocument(size, timeoutMs);
+    }
+
+private:
+    xavo::test::SnmpAgent snmp_;
+    xavo::test::SocketListener socketPrinter_;
+    // The IPP printer registers with the daemon, so it goes first: members
+    // are stopped in the reverse order.
+    xavo::test::AvahiResponder avahi_;
+    xavo::test::IppPrinter ippPrinter_;
+};
 
 }  // namespace xavo::demo

@@ -28,6 +28,7 @@
 #include <string>
 #include <vector>
 
+#include "demo/chapters.h"
 #include "demo/stage.h"
 #include "demo/walk.h"
 #include "sandbox/cupsd.h"
@@ -73,24 +74,13 @@ void UsbChapters(Walk &walk) {
     walk.Step(std::string("wc -c <") + kUsbPaper, 0, std::to_string(xavo::test::ReadFile("/usr/share/cups/data/testprint").size()));
 }
 
-void NetworkChapters(Walk &walk, xavo::test::SocketListener &netPrinter) {
+void NetworkChapters(Walk &walk, Stage &stage) {
     walk.Chapter("A network printer");
     walk.Step(std::string("xavoprinter net ping ") + kNetIp, 0, "Online");
     walk.Note("Identified by SNMP (then mDNS and BJNP when SNMP finds nothing):");
     Ran probe = walk.Step(std::string("xavoprinter net probe ") + kNetIp + " --json", 0, "\"identified_by\":\"snmp\"");
-    const std::string backend = JsonText(probe.output, "backend");
-    const std::string queue = JsonText(probe.output, "queue");
-    const std::string brand = JsonText(probe.output, "brand");
-    const std::string model = JsonText(probe.output, "model");
-    const std::string deviceId = JsonText(probe.output, "device_id");
     walk.Note("Registered with what the probe found: section, table line, share, queue:");
-    std::string add = std::string("xavoprinter net add ") + kNetIp + " " + kNetQueueName + " --backend " +
-                      Quoted(backend.empty() ? "socket" : backend);
-    if (!queue.empty()) add += " --queue " + Quoted(queue);
-    if (!brand.empty()) add += " --brand " + Quoted(brand);
-    if (!model.empty()) add += " --model " + Quoted(model);
-    if (!deviceId.empty()) add += " --device-id " + Quoted(deviceId);
-    walk.Step(add, 0, "socket://127.0.0.1");
+    walk.Step(NetAddCommand(kNetIp, kNetQueueName, probe.output), 0, "socket://127.0.0.1");
     const std::string net = std::string(kNetIp) + "-" + kNetQueueName;
     walk.Step("cat /usr/xavo/etc/nptab", 0, kNetQueueName);
     walk.Step(std::string("xavoprinter net check ") + kNetIp + " " + kNetQueueName, 0, "in use for this address");
@@ -102,7 +92,7 @@ void NetworkChapters(Walk &walk, xavo::test::SocketListener &netPrinter) {
     walk.Step("cat /tmp/letter.txt");
     walk.Step("xavoprinter print " + net + " /tmp/letter.txt --title letter");
     walk.Step("xavoprinter job wait " + net + " letter --timeout 30", 0, "complete");
-    const std::string got = netPrinter.WaitForBytes(letter.size(), 10000);
+    const std::string got = stage.SocketPrinterGot(letter.size(), 10000);
     Say(std::string("   the printer on ") + kNetIp + ":" + std::to_string(kNetPort) + " received " +
         std::to_string(got.size()) + " bytes");
     walk.Check(got == letter, "the bytes that arrived are the file's");
@@ -133,6 +123,7 @@ void CleanUpChapter(Walk &walk) {
     walk.Step(std::string("xavoprinter usb disable ") + kUsbDev + " " + kUsbBus);
     walk.Step("xavoprinter queue remove " + usb);
     walk.Step(std::string("xavoprinter net remove ") + kNetIp + " " + kNetQueueName);
+    walk.Step(std::string("xavoprinter net remove ") + kMdnsIp + " " + kMdnsQueueName);
     walk.Note("Cancelling every job asks lprm for \"all\", which Debian's lprm does not know: the library");
     walk.Note("logs that and empties the spool directory anyway.");
     walk.Step("xavoprinter spool clean", 0, "cleaned: yes");
@@ -142,7 +133,7 @@ void CleanUpChapter(Walk &walk) {
     walk.Step("xavoprinter show " + usb, 0, "cups printer name");
 }
 
-int RunDemo(bool bShell, const std::string &cliDir, const std::string &preload) {
+std::vector<std::string> WalkEnvironment(const std::string &cliDir, const std::string &preload) {
     const char *term = std::getenv("TERM");
     std::vector<std::string> env = {
         "PATH=" + cliDir + ":/usr/local/sbin:/usr/local/bin:/usr/sbin:/usr/bin:/sbin:/bin",
@@ -155,28 +146,27 @@ int RunDemo(bool bShell, const std::string &cliDir, const std::string &preload) 
     // sanitizer runtime unless told that this one is expected.
     env.push_back("ASAN_OPTIONS=verify_asan_link_order=0:detect_leaks=1");
 #endif
+    return env;
+}
 
+int RunDemo(bool bShell, const std::string &cliDir, const std::string &preload) {
+    const std::vector<std::string> env = WalkEnvironment(cliDir, preload);
     Say(Paint("1", "xavoprinter demo: a network storage appliance's printers, in a sandbox"));
     Say("Private mount and network namespaces: /usr /etc /var are overlays whose writes vanish, /tmp /run /dev");
     Say("are fresh, the network is loopback only. Nothing here touches the host.");
     SetTheStage();
-    Say("Started: cupsd (pid " + std::to_string(xavo::test::Cupsd::Pid()) + "), a USB printer ACME Model 100 on " +
-        kUsbDev + " (bus " + kUsbBus + "),");
-    xavo::test::SnmpAgent snmp(kNetIp, {{".1.1.0", "integer", "7"},
-                                        {".1.2.0", "octet_str", kNetDeviceId},
-                                        {".1.3.0", "octet_str", kNetUri}});
-    xavo::test::SocketListener netPrinter(kNetPort);
-    Say(std::string("and a network printer ACME Laser 5 on ") + kNetIp + " (snmpd answering for it, port " +
-        std::to_string(netPrinter.Port()) + " receiving its jobs).");
-    if (!snmp.running() || netPrinter.Port() != kNetPort || xavo::test::Cupsd::Pid() <= 0) {
-        Say(Paint("31", "the appliance's peers did not start"));
+    Stage stage;
+    if (const std::string missing = stage.Missing(); !missing.empty()) {
+        Say(Paint("31", "the appliance's peers did not start:" + missing));
         return 1;
     }
     xavo::test::TakeLogs();
 
     Walk walk(env);
     UsbChapters(walk);
-    NetworkChapters(walk, netPrinter);
+    NetworkChapters(walk, stage);
+    MdnsChapters(walk, stage);
+    NobodyChapter(walk);
     if (bShell) OpenShell(env);
     CleanUpChapter(walk);
 
