@@ -24,6 +24,7 @@ samba-common-bin iproute2 iputils-ping
 cups cups-client cups-bsd
 snmp snmpd
 avahi-daemon avahi-utils dbus
+cups-ipp-utils cups-backend-bjnp
 psmisc procps"
 
 missing=""
