@@ -38,7 +38,9 @@ inline constexpr const char *kMdnsIp = xavo::test::IppPrinter::kIpv4;
 inline constexpr char kMdnsQueueName[] = "reception";
 // An address where nothing answers: SNMP, mDNS and BJNP all come back empty.
 inline constexpr char kNobodyIp[] = "127.0.0.3";
-// Debian's BJNP backend, run by the library as it is.
+// Debian's BJNP backend (cups-backend-bjnp), run by the library as it is:
+// the sandbox's /usr is an overlay of the host's, so the installed program
+// is there, beside the USB backend the stage places over the real one.
 inline constexpr char kBjnpBackend[] = "/usr/lib/cups/backend/bjnp";
 
 // Starts cupsd, plugs the USB printer in and places what the peers' clients

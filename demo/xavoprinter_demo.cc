@@ -5,9 +5,12 @@
 // test suites), so the library's absolute paths ("/usr/xavo/etc/printer.conf",
 // "/tmp/usbtab", "/dev/usb/lp0", CUPS's files) are private, and starts the
 // appliance's peers inside: a real cupsd, a simulated USB printer on "lp0"
-// that answers a device ID string, and a network printer on 127.0.0.1 (a
+// that answers a device ID string, a network printer on 127.0.0.1 (a
 // real snmpd answering for it, a socket listener on port 9100 receiving
-// its jobs).  Then it walks through the appliance's life with the
+// its jobs), and an IPP printer on 127.0.0.2 that only mDNS makes known
+// (CUPS's ippeveprinter, announced by the sandbox's own avahi-daemon, seen
+// through the real avahi-browse); the BJNP backend is Debian's (see
+// stage.h).  Then it walks through the appliance's life with the
 // xavoprinter command, printing every command so that a person can repeat
 // it.  Everything lives in namespaces and tmpfs: when the demo ends, by
 // success, failure or Ctrl-C, nothing is left on the host.
@@ -101,7 +104,8 @@ void NetworkChapters(Walk &walk, Stage &stage) {
 void OpenShell(const std::vector<std::string> &env) {
     Say("\n" + Paint("1", "== A shell in the sandbox"));
     Say("The printers are still there: try 'xavoprinter --help', 'xavoprinter list', 'lpstat -t',");
-    Say("'cat /usr/xavo/etc/printer.conf', 'testparm -s /etc/samba/smb.reserved.conf'.");
+    Say("'cat /usr/xavo/etc/printer.conf', 'testparm -s /etc/samba/smb.reserved.conf', 'avahi-browse -arpt',");
+    Say(std::string("'xavoprinter net probe ") + kMdnsIp + "'.");
     Say("Leave with 'exit': the demo then unplugs the printer and cleans up.");
     pid_t pid = -1;
     const std::vector<std::string> args = {"/bin/bash", "--norc"};
@@ -187,7 +191,8 @@ int main(int argc, char **argv) {
             std::printf(
                 "usage: xavoprinter-demo [--shell]\n\n"
                 "Starts a sandbox standing for a whole appliance (private cupsd, a simulated USB printer on\n"
-                "lp0, a network printer on 127.0.0.1) and walks through the printers' life with xavoprinter.\n"
+                "lp0, a network printer on 127.0.0.1, an IPP printer on 127.0.0.2 known only by mDNS) and\n"
+                "walks through the printers' life with xavoprinter.\n"
                 "Needs root (namespaces and mounts); leaves nothing on the host.\n\n"
                 "  --shell   open a shell inside the sandbox before the clean-up steps\n");
             return 0;
@@ -219,7 +224,8 @@ int main(int argc, char **argv) {
     xavo::test::detail::StopLeftovers();
     const std::vector<xavo::test::SandboxProcess> left = xavo::test::Descendants();
     if (left.empty()) {
-        Say("Stopped cupsd, snmpd and the printers; the sandbox's files go with its namespaces.");
+        Say("Stopped cupsd, snmpd, avahi-daemon, dbus-daemon and the printers; the sandbox's files go with its\n"
+            "namespaces.");
     } else {
         for (const xavo::test::SandboxProcess &p : left) {
             std::fprintf(stderr, "xavoprinter-demo: still running: %d %s\n", static_cast<int>(p.pid), p.comm.c_str());

@@ -63,14 +63,17 @@ public:
     static constexpr char kSpool[] = "/tmp/xavo-ippeve";
 
     IppPrinter() {
-        mkdir(kSpool, 0755);
+        const std::string spool = kSpool;
+        for (const std::string &dir : {spool, spool + "/jobs", spool + "/keys"}) mkdir(dir.c_str(), 0700);
         PlaceFile("/etc/hosts", ReadFile("/etc/hosts") + kIpv4 + " " + kHost + "\n" + kIpv6 + " " + kHost + "\n");
         AddIpv6ToLoopback();
+        // Its TLS keys and anything it keeps per user stay in the sandbox's
+        // tmpfs, whatever HOME the demo was started with.
         pid_ = StartDaemon({"/usr/sbin/ippeveprinter", "-n", kHost, "-p", std::to_string(kPort), "-M", kMake, "-m",
-                            kModel, "-d", std::string(kSpool) + "/jobs", "-k", "-c", "/bin/true", "-f",
+                            kModel, "-d", spool + "/jobs", "-k", "-K", spool + "/keys", "-c", "/bin/true", "-f",
                             "application/octet-stream,text/plain", std::string(kMake) + " " + kModel},
-                           std::string(kSpool) + "/ippeveprinter.log");
-        mkdir((std::string(kSpool) + "/jobs").c_str(), 0755);
+                           spool + "/ippeveprinter.log",
+                           {"HOME=" + spool, "TMPDIR=" + spool, "PATH=/usr/sbin:/usr/bin:/sbin:/bin", "LANG=C.UTF-8"});
         for (int i = 0; i < 250 && Alive() && !Accepts(); ++i) poll(nullptr, 0, 20);
         for (int i = 0; i < 5 && Alive() && Accepts() && !ready_; ++i) ready_ = Announced();
     }
