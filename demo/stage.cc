@@ -57,4 +57,9 @@ std::string Stage::Missing() const {
     return missing;
 }
 
+std::string Stage::MdnsLogs() {
+    return "avahi-daemon:\n" + xavo::test::AvahiResponder::DaemonLog() + "ippeveprinter:\n" +
+           xavo::test::IppPrinter::Log();
+}
+
 }  // namespace xavo::demo

@@ -55,6 +55,8 @@ public:
 
     // Every peer runs; otherwise what is missing, in words.
     std::string Missing() const;
+    // What the mDNS peers said, for when they did not start.
+    static std::string MdnsLogs();
     // The documents the network printers received: everything sent to the
     // socket printer; the first document the IPP printer kept.
     std::string SocketPrinterGot(size_t size, int timeoutMs) { return socketPrinter_.WaitForBytes(size, timeoutMs); }

@@ -162,6 +162,7 @@ int RunDemo(bool bShell, const std::string &cliDir, const std::string &preload) 
     Stage stage;
     if (const std::string missing = stage.Missing(); !missing.empty()) {
         Say(Paint("31", "the appliance's peers did not start:" + missing));
+        Say(Stage::MdnsLogs());
         return 1;
     }
     xavo::test::TakeLogs();

@@ -57,7 +57,7 @@ public:
     static constexpr char kIpv4[] = "127.0.0.2";
     static constexpr char kIpv6[] = "fd00:78a0::2";
     static constexpr int kPort = 631;  // the IPP port: CUPS's ipp backend needs no port in the URI
-    static constexpr char kResource[] = "ipp/print";
+    static constexpr char kResource[] = "ipp/print";  // ippeveprinter's own, announced as the TXT key "rp"
     static constexpr char kMake[] = "ACME";
     static constexpr char kModel[] = "Jet 7";
     static constexpr char kSpool[] = "/tmp/xavo-ippeve";
