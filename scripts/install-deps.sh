@@ -22,9 +22,9 @@ fi
 PACKAGES="cmake ninja-build g++ pkg-config libgtest-dev libgmock-dev libsodium-dev
 samba-common-bin iproute2 iputils-ping
 cups cups-client cups-bsd
+cups-ipp-utils cups-backend-bjnp
 snmp snmpd
 avahi-daemon avahi-utils dbus
-cups-ipp-utils cups-backend-bjnp
 psmisc procps"
 
 missing=""
