@@ -67,8 +67,11 @@ void MdnsChapters(Walk &walk, Stage &stage) {
     const std::string net = ip + "-" + kMdnsQueueName;
     const std::string memo = "Memo: the IPP printer was found by its mDNS announcement alone.\n";
     xavo::test::PlaceFile("/tmp/memo.txt", memo);
-    walk.Step("xavoprinter print " + net + " /tmp/memo.txt --title memo");
-    walk.Step("xavoprinter job wait " + net + " memo --timeout 30", 0, "complete");
+    const Ran printed = walk.Step("xavoprinter print " + net + " /tmp/memo.txt --title memo --json");
+    // The handle print gives for the job, where it gives one; else the title.
+    const std::string job = JsonText(printed.output, "job");
+    walk.Step("xavoprinter job wait " + net + " " + Quoted(job.empty() ? "memo" : job) + " --timeout 30", 0,
+              "complete");
     const std::string got = stage.IppPrinterGot(memo.size(), 10000);
     Say("   the printer on " + ip + ":" + std::to_string(IppPrinter::kPort) + " kept a document of " +
         std::to_string(got.size()) + " bytes");
