@@ -48,10 +48,11 @@ void MdnsChapters(Walk &walk, Stage &stage) {
     const std::string ip = kMdnsIp;
     const std::string browser = xavo::test::AvahiResponder::kBrowsePath;
     walk.Chapter("A printer known only by mDNS");
-    walk.Note(std::string("An IPP printer on ") + ip + " answers no SNMP. It announces itself by multicast DNS, through");
-    walk.Note("the sandbox's avahi-daemon; the appliance's browser is the real avahi-browse:");
+    walk.Note("An IPP printer on " + ip + " answers no SNMP. It announces itself by multicast DNS, through the");
+    walk.Note("sandbox's avahi-daemon; the appliance's browser is the real avahi-browse:");
     walk.Step("ls -l " + browser, 0, "/usr/bin/avahi-browse");
-    const Ran browse = walk.Step(browser + " -rpt _ipp._tcp", 0, ";" + ip + ";" + std::to_string(IppPrinter::kPort) + ";");
+    const std::string service = ";" + ip + ";" + std::to_string(IppPrinter::kPort) + ";";
+    const Ran browse = walk.Step(browser + " -rpt _ipp._tcp", 0, service);
     walk.Note("SNMP finds nothing there, so the probe browses: the IPP port gives the backend. The printer names");
     walk.Note("itself only in the \"ty\" key, not in the usb_MFG and usb_MDL keys the library reads, so make and");
     walk.Note("model are recorded as \"Not Found\" (and the library logs why):");

@@ -1,11 +1,14 @@
 #include "demo/walk.h"
 
 #include <fcntl.h>
+#include <poll.h>
+#include <signal.h>
 #include <spawn.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <cerrno>
+#include <chrono>
 #include <cstdio>
 #include <regex>
 
@@ -41,8 +44,45 @@ int WaitExit(pid_t pid) {
 }
 
 
+namespace {
+
+// A step that has not ended by then is stopped: the longest wait of the
+// walk-through is a job wait of 30 seconds.
+constexpr int kStepLimitMs = 120000;
+
+// Shows what comes through fd, indented line by line, and keeps it in out;
+// false when the step's time ran out first.
+bool ShowUntilEnd(int fd, std::string &out) {
+    std::string pending;
+    char buf[4096];
+    using Clock = std::chrono::steady_clock;
+    const Clock::time_point deadline = Clock::now() + std::chrono::milliseconds(kStepLimitMs);
+    bool bEnded = false;
+    while (!bEnded) {
+        const auto left = std::chrono::duration_cast<std::chrono::milliseconds>(deadline - Clock::now()).count();
+        if (left <= 0) break;
+        pollfd p{fd, POLLIN, 0};
+        if (poll(&p, 1, static_cast<int>(left)) <= 0) continue;  // interrupted, or the time is up
+        ssize_t n = read(fd, buf, sizeof buf);
+        if (n < 0 && errno == EINTR) continue;
+        bEnded = n <= 0;
+        if (bEnded) break;
+        out.append(buf, static_cast<size_t>(n));
+        pending.append(buf, static_cast<size_t>(n));
+        for (size_t nl; (nl = pending.find('\n')) != std::string::npos; pending.erase(0, nl + 1)) {
+            Say("    " + pending.substr(0, nl));
+        }
+    }
+    if (!pending.empty()) Say("    " + pending);
+    return bEnded;
+}
+
+}  // namespace
+
 // Runs one shell command line in the sandbox and shows its output as it
-// comes, indented, keeping a copy for the walk-through's checks.
+// comes, indented, keeping a copy for the walk-through's checks.  A step
+// that outlives its time is killed by its pid (its own children, if any,
+// are stopped with the sandbox's other leftovers at the end).
 Ran RunShown(const std::string &command, const std::vector<std::string> &env) {
     int fds[2];
     Ran ran;
@@ -60,19 +100,10 @@ Ran RunShown(const std::string &command, const std::vector<std::string> &env) {
     posix_spawn_file_actions_destroy(&actions);
     close(fds[1]);
     if (rc == 0) {
-        std::string pending;
-        char buf[4096];
-        for (;;) {
-            ssize_t n = read(fds[0], buf, sizeof buf);
-            if (n < 0 && errno == EINTR) continue;
-            if (n <= 0) break;
-            ran.output.append(buf, static_cast<size_t>(n));
-            pending.append(buf, static_cast<size_t>(n));
-            for (size_t nl; (nl = pending.find('\n')) != std::string::npos; pending.erase(0, nl + 1)) {
-                Say("    " + pending.substr(0, nl));
-            }
+        if (!ShowUntilEnd(fds[0], ran.output)) {
+            Say("    (stopped after " + std::to_string(kStepLimitMs / 1000) + " seconds)");
+            kill(pid, SIGKILL);
         }
-        if (!pending.empty()) Say("    " + pending);
         ran.status = WaitExit(pid);
     }
     close(fds[0]);

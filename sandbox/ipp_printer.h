@@ -26,9 +26,11 @@
 // Documents: the printer's "print command" is /bin/true, so a job is done
 // as soon as it has arrived (without one ippeveprinter pretends to print
 // for 5 to 15 seconds); with "-k" the document stays in the spool
-// directory, as "<job>-<title>.dat" for the raw documents CUPS sends.  The printer runs in the foreground as a child of the process
-// that starts it and is stopped by its own pid; its messages go to a file
-// under kSpool, not to the captured syslog.
+// directory, as "<job>-<title>.dat" for the raw documents CUPS sends.
+//
+// The printer runs in the foreground as a child of the process that starts
+// it and is stopped by its own pid; its messages go to a file under
+// kSpool, not to the captured syslog.
 #pragma once
 
 #include <arpa/inet.h>
