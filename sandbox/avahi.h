@@ -17,6 +17,12 @@
 // The daemon publishes no address of its own (its host name would claim
 // 127.0.0.1 as well) and listens on lo only, IPv4 only.
 //
+// A program that registers its services over D-Bus, as CUPS's ippeveprinter
+// does, cannot name a host: its services carry the daemon's own host name
+// "xavo-sandbox.local".  Given an address (ownAddress), that name is mapped
+// to it like a printer's static host name, so that the services resolve to
+// the program's own address; without one they do not resolve at all.
+//
 // Starting costs about a second: avahi probes each name before it claims
 // it.  ready() is true once every host name and service group is
 // established; from then on a browse resolves all of them.  A browse with
@@ -63,9 +69,10 @@ public:
     static constexpr char kDir[] = "/tmp/xavo-avahi";
     static constexpr char kBusSocket[] = "/run/dbus/system_bus_socket";
     static constexpr char kBrowsePath[] = "/usr/xavo/sbin/avahi-browse";
+    static constexpr char kOwnHost[] = "xavo-sandbox";
 
-    explicit AvahiResponder(const std::vector<MdnsPrinter> &printers) {
-        WriteConfiguration(printers);
+    explicit AvahiResponder(const std::vector<MdnsPrinter> &printers, const std::string &ownAddress = "") {
+        WriteConfiguration(printers, ownAddress);
         EnableLoopbackMulticast();
         mkdir("/run/dbus", 0755);
         mkdir("/usr/xavo/sbin", 0755);
@@ -83,8 +90,8 @@ public:
                          "--no-chroot", "--no-rlimits"},
                         log);
         // One line for each static host name and one for each service group.
-        const size_t expected = 2 * printers.size();
-        for (int i = 0; i < 500 && Running(daemon_) && !ready_; ++i) {
+        const size_t expected = 2 * printers.size() + (ownAddress.empty() ? 0 : 1);
+        for (int i = 0; i < 500 && DaemonRunning(daemon_) && !ready_; ++i) {
             ready_ = Count(ReadFile(log), "successfully established") >= expected;
             if (!ready_) poll(nullptr, 0, 20);
         }
@@ -96,7 +103,7 @@ public:
         StopDaemon(bus_);
     }
 
-    bool ready() const { return ready_ && Running(daemon_) && Running(bus_); }
+    bool ready() const { return ready_ && DaemonRunning(daemon_) && DaemonRunning(bus_); }
     // What the daemon said, for a failure message.
     static std::string DaemonLog() { return ReadFile(std::string(kDir) + "/daemon.log"); }
 
@@ -112,7 +119,7 @@ private:
         return out;
     }
 
-    static void WriteConfiguration(const std::vector<MdnsPrinter> &printers) {
+    static void WriteConfiguration(const std::vector<MdnsPrinter> &printers, const std::string &ownAddress) {
         PlaceFile(std::string(kDir) + "/bus.conf",
                   "<!DOCTYPE busconfig PUBLIC \"-//freedesktop//DTD D-Bus Bus Configuration 1.0//EN\"\n"
                   " \"http://www.freedesktop.org/standards/dbus/1.0/busconfig.dtd\">\n"
@@ -129,7 +136,7 @@ private:
                   "</busconfig>\n");
         PlaceFile(std::string(kDir) + "/avahi-daemon.conf",
                   "[server]\n"
-                  "host-name=xavo-sandbox\n"
+                  "host-name=" + std::string(kOwnHost) + "\n"
                   "domain-name=local\n"
                   "use-ipv4=yes\n"
                   "use-ipv6=no\n"
@@ -145,7 +152,7 @@ private:
                   "publish-hinfo=no\n"
                   "publish-workstation=no\n"
                   "publish-domain=no\n");
-        std::string hosts;
+        std::string hosts = ownAddress.empty() ? "" : ownAddress + " " + kOwnHost + ".local\n";
         for (const MdnsPrinter &p : printers) {
             hosts += p.address + " " + p.host + ".local\n";
             std::string group =
@@ -173,14 +180,6 @@ private:
             ioctl(fd, SIOCSIFFLAGS, &ifr);
         }
         close(fd);
-    }
-
-    // Our child, not yet exited (a zombie counts as gone).
-    static bool Running(pid_t pid) {
-        if (pid <= 0) return false;
-        std::string stat = ReadFile("/proc/" + std::to_string(pid) + "/stat");
-        std::string::size_type close = stat.rfind(')');
-        return close != std::string::npos && close + 2 < stat.size() && stat[close + 2] != 'Z';
     }
 
     static size_t Count(const std::string &text, const char *szWhat) {

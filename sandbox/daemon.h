@@ -12,6 +12,8 @@
 #include <string>
 #include <vector>
 
+#include "sandbox/sandbox.h"
+
 extern char **environ;
 
 namespace xavo::test {
@@ -40,6 +42,16 @@ inline pid_t StartDaemon(const std::vector<std::string> &argv, const std::string
     }
     posix_spawn_file_actions_destroy(&actions);
     return pid;
+}
+
+// Our child, not yet exited (a zombie counts as gone).  Leaves it to be
+// reaped by StopDaemon, so that its pid cannot be taken by another process
+// meanwhile.
+inline bool DaemonRunning(pid_t pid) {
+    if (pid <= 0) return false;
+    std::string stat = ReadFile("/proc/" + std::to_string(pid) + "/stat");
+    std::string::size_type close = stat.rfind(')');
+    return close != std::string::npos && close + 2 < stat.size() && stat[close + 2] != 'Z';
 }
 
 // SIGTERM, up to graceMs to go, then SIGKILL; reaped either way.

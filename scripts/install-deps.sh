@@ -22,6 +22,7 @@ fi
 PACKAGES="cmake ninja-build g++ pkg-config libgtest-dev libgmock-dev libsodium-dev
 samba-common-bin iproute2 iputils-ping
 cups cups-client cups-bsd
+cups-ipp-utils cups-backend-bjnp
 snmp snmpd
 avahi-daemon avahi-utils dbus
 psmisc procps
@@ -31,7 +32,8 @@ libcli11-dev nlohmann-json3-dev python3"
 
 missing=""
 for p in $PACKAGES; do
-    if ! dpkg-query -W -f='${Status}' "$p" 2>/dev/null | grep -q '^install ok installed$'; then
+    # One status line per installed architecture (i386 multiarch too).
+    if ! dpkg-query -W -f='${Status}\n' "$p" 2>/dev/null | grep -q '^install ok installed$'; then
         missing="$missing $p"
     fi
 done
