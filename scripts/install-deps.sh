@@ -61,7 +61,18 @@ trap cleanup EXIT INT TERM
 if ! dpkg --print-foreign-architectures | grep -qx i386; then
     dpkg --add-architecture i386
 fi
-apt-get update -qq
+# A mirror in the middle of a sync can fail one index ("File has unexpected
+# size"); apt then keeps the lists it had.  Try a few times, then go on with
+# what was fetched: the install below fails clearly if a package is missing.
+for try in 1 2 3; do
+    if apt-get update -qq; then
+        break
+    fi
+    echo "install-deps.sh: apt-get update failed (try $try of 3)" >&2
+    if [ "$try" -lt 3 ]; then
+        sleep 15
+    fi
+done
 # shellcheck disable=SC2086
 apt-get install -y -qq --no-install-recommends \
     -o Dpkg::Options::=--force-confdef -o Dpkg::Options::=--force-confold $missing >/dev/null
