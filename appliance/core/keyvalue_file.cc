@@ -9,6 +9,7 @@
 #include <string>
 #include <vector>
 
+#include "common/replace_lock.h"
 #include "common/text_files.h"
 #include "core/containers.h"
 
@@ -72,7 +73,7 @@ XAVO_PLATFORM_API int32_t ORLICFileSetKeyValue(const char *szPath, const char *s
         SetError(kErrBadParameters, kUnit, __LINE__);
         return -1;
     }
-    return XAVO_GUARD(int32_t{-1}, [&] {
+    return XAVO_GUARD_WRITE(szPath, int32_t{-1}, [&] {
         // A missing file is created: the USB printer table is gone after
         // every restart until its first entry is set.
         std::string text;
@@ -101,7 +102,7 @@ XAVO_PLATFORM_API int32_t ORLICFileRemoveKey(const char *szPath, const char *szK
         SetError(kErrBadParameters, kUnit, __LINE__);
         return -1;
     }
-    return XAVO_GUARD(int32_t{-1}, [&] {
+    return XAVO_GUARD_WRITE(szPath, int32_t{-1}, [&] {
         std::string text;
         if (!LoadTextFile(szPath, true, &text, kUnit, __LINE__)) return int32_t{-1};
         std::vector<std::string> lines = SplitLines(text);

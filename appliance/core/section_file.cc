@@ -12,6 +12,7 @@
 #include <string>
 #include <vector>
 
+#include "common/replace_lock.h"
 #include "common/text_files.h"
 #include "core/containers.h"
 
@@ -141,7 +142,7 @@ XAVO_PLATFORM_API int32_t ORLICFileAddSection(const char *szPath, const char *sz
         SetError(kErrBadParameters, kUnit, __LINE__);
         return -1;
     }
-    return XAVO_GUARD(int32_t{-1}, [&] {
+    return XAVO_GUARD_WRITE(szPath, int32_t{-1}, [&] {
         std::string text;
         if (!LoadTextFile(szPath, true, &text, kUnit, __LINE__)) return int32_t{-1};
         if (!Document(text).Named(szSection).empty()) return int32_t{0};
@@ -165,7 +166,7 @@ XAVO_PLATFORM_API int32_t ORLICFileSetSection(const char *szPath, const char *sz
         SetError(kErrBadParameters, kUnit, __LINE__);
         return -1;
     }
-    return XAVO_GUARD(int32_t{-1}, [&] {
+    return XAVO_GUARD_WRITE(szPath, int32_t{-1}, [&] {
         std::string text;
         if (!LoadTextFile(szPath, true, &text, kUnit, __LINE__)) return int32_t{-1};
         Document doc(text);
@@ -234,7 +235,7 @@ XAVO_PLATFORM_API int32_t ORLICFileSetSectionValue(const char *szPath, const cha
         SetError(kErrBadParameters, kUnit, __LINE__);
         return -1;
     }
-    return XAVO_GUARD(int32_t{-1}, [&] {
+    return XAVO_GUARD_WRITE(szPath, int32_t{-1}, [&] {
         // Only an existing section gets the key: a section made up here
         // would be a record of a printer nobody set up.
         auto doc = LoadWithSection(szPath, szSection, __LINE__);
