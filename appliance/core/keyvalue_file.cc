@@ -3,7 +3,8 @@
 //
 // A key set twice reads as its last value, as a shell reading the file
 // would see it; setting a key leaves exactly one line for it.  Writing
-// changes only the key's line and replaces the file atomically.
+// changes only the key's line and replaces the file atomically, holding
+// the file's write lock from the read on (replace_lock.h).
 #include <algorithm>
 #include <cstring>
 #include <string>

@@ -6,7 +6,8 @@
 // white space around "=" and around the value is dropped, a key set twice
 // keeps its last value and two sections of one name read as one.  Writing
 // changes only the section concerned; every other line of the file stays as
-// it was, comments included, and the file is replaced atomically.
+// it was, comments included, and the file is replaced atomically, under
+// the file's write lock from the read on (replace_lock.h).
 #include <algorithm>
 #include <cstring>
 #include <string>
