@@ -15,6 +15,7 @@
 
 #include "sandbox/sandbox.h"
 #include "support/proof_tally.h"
+#include "support/records.h"
 #include "support/sections.h"
 #include "xavoprinter.h"
 
@@ -35,11 +36,7 @@ bool HoldsCanary(const std::string &text) {
 }
 
 bool SetCloud(const char *szPassword, const char *szToken) {
-    PrinterGoogleInfo info;
-    std::memset(&info, 0, sizeof info);
-    std::strcpy(info.szAccount, "owner@example.com");
-    std::snprintf(info.szPassword, sizeof info.szPassword, "%s", szPassword);
-    std::snprintf(info.szRefreshToken, sizeof info.szRefreshToken, "%s", szToken);
+    const PrinterGoogleInfo info = CloudRecord("owner@example.com", szPassword, szToken);
     return XAVOPrinterGoogleInfoSet(&info) == 0;
 }
 

@@ -9,6 +9,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <cstddef>
 #include <chrono>
 #include <cstring>
 #include <functional>
@@ -40,28 +41,32 @@ constexpr char kSectionFmt[] = "\t%s = %s\n";
 
 std::string Value(int p, int i) { return "v" + std::to_string(p) + "-" + std::to_string(i); }
 
-UsbPrinterConf UsbRecord(const std::string &id) {
-    UsbPrinterConf conf;
-    std::memset(&conf, 0, sizeof conf);
-    std::snprintf(conf.szPrinterId, sizeof conf.szPrinterId, "%s", id.c_str());
-    return conf;
-}
+// The keys each of the eight processes owns in the shared sections, and
+// where the record fields that carry them lie (eight bytes or more each).
+struct OwnedKey {
+    const char *szUsbKey;
+    size_t usbField;
+    const char *szNetKey;
+    size_t netField;
+};
+#define XAVO_USB(field) offsetof(UsbPrinterConf, field)
+#define XAVO_NET(field) offsetof(NetPrinterConf, field)
+constexpr OwnedKey kOwnedKeys[] = {
+    {"producer", XAVO_USB(szProducer), "Brand", XAVO_NET(szBrand)},
+    {"product name", XAVO_USB(szProductName), "Model", XAVO_NET(szModel)},
+    {"mode", XAVO_USB(szMode), "enable airprint", XAVO_NET(szEnableAirprint)},
+    {"driver", XAVO_USB(szDriver), "enable google cloud print", XAVO_NET(szEnableGoogleCloudPrint)},
+    {"driver brand", XAVO_USB(szDriverBrand), "driver brand", XAVO_NET(szDriverBrand)},
+    {"usblp string id", XAVO_USB(szUsblpStringId), "driver", XAVO_NET(szDriver)},
+    {"fit to page", XAVO_USB(szFitToPage), "string id", XAVO_NET(szStringId)},
+    {"enable airprint", XAVO_USB(szEnableAirprint), "fit to page", XAVO_NET(szFitToPage)},
+};
+#undef XAVO_USB
+#undef XAVO_NET
 
-// The keys each of the eight processes owns in the shared sections, and the
-// record fields that carry them (eight bytes or more each).
-constexpr const char *kUsbKeys[] = {"producer", "product name", "mode", "driver",
-                                    "driver brand", "usblp string id", "fit to page", "enable airprint"};
-char *UsbField(UsbPrinterConf &c, int p) {
-    char *fields[] = {c.szProducer, c.szProductName, c.szMode, c.szDriver,
-                      c.szDriverBrand, c.szUsblpStringId, c.szFitToPage, c.szEnableAirprint};
-    return fields[p];
-}
-constexpr const char *kNetKeys[] = {"Brand", "Model", "enable airprint", "enable google cloud print",
-                                    "driver brand", "driver", "string id", "fit to page"};
-char *NetField(NetPrinterConf &c, int p) {
-    char *fields[] = {c.szBrand, c.szModel, c.szEnableAirprint, c.szEnableGoogleCloudPrint,
-                      c.szDriverBrand, c.szDriver, c.szStringId, c.szFitToPage};
-    return fields[p];
+template <class Record>
+void PutField(Record *pRecord, size_t offset, const std::string &value) {
+    std::snprintf(reinterpret_cast<char *>(pRecord) + offset, 8, "%s", value.c_str());
 }
 constexpr int kProcesses = 8;
 constexpr int kSetups = 25;
@@ -70,18 +75,16 @@ constexpr int kSetups = 25;
 // shared ones, and the cloud account.
 bool Setups(int p, int i) {
     const std::string v = Value(p, i);
-    UsbPrinterConf own = UsbRecord("usb-own-" + std::to_string(p));
+    UsbPrinterConf own = UsbRecord(("usb-own-" + std::to_string(p)).c_str());
     std::snprintf(own.szDriver, sizeof own.szDriver, "%s", v.c_str());
     UsbPrinterConf shared = UsbRecord("usb-shared");
-    std::snprintf(UsbField(shared, p), 8, "%s", v.c_str());
+    PutField(&shared, kOwnedKeys[p].usbField, v);
     NetPrinterConf netOwn = NetRecord(("10.1.0." + std::to_string(p + 1)).c_str(), "own");
     std::snprintf(netOwn.szDriver, sizeof netOwn.szDriver, "%s", v.c_str());
     NetPrinterConf netShared = NetRecord("10.1.1.1", "shared");
-    std::snprintf(NetField(netShared, p), 8, "%s", v.c_str());
-    PrinterGoogleInfo cloud;
-    std::memset(&cloud, 0, sizeof cloud);
-    std::snprintf(cloud.szAccount, sizeof cloud.szAccount, "account%d", p);
-    std::snprintf(cloud.szPassword, sizeof cloud.szPassword, "pw-%s", v.c_str());
+    PutField(&netShared, kOwnedKeys[p].netField, v);
+    const PrinterGoogleInfo cloud =
+        CloudRecord(("account" + std::to_string(p)).c_str(), ("pw-" + v).c_str(), "");
     return XAVOPrinterConfSetup(&own, 0) == 0 && XAVOPrinterConfSetup(&shared, 0) == 0 &&
            XAVOPrinterNetConfSetup(&netOwn, 0) == 0 && XAVOPrinterNetConfSetup(&netShared, 0) == 0 &&
            XAVOPrinterGoogleInfoSet(&cloud) == 0;
@@ -148,9 +151,9 @@ TEST(FileProofs, ConcurrentWritersLoseNoKeyAndNoTableLine) {
     const int last = kSetups - 1;
     for (int p = 0; p < kProcesses; ++p) {
         tally.Check(ReadSection(kConf, "usb-own-" + std::to_string(p))["driver"] == Value(p, last));
-        tally.Check(ReadSection(kConf, "usb-shared")[kUsbKeys[p]] == Value(p, last));
+        tally.Check(ReadSection(kConf, "usb-shared")[kOwnedKeys[p].szUsbKey] == Value(p, last));
         tally.Check(ReadSection(kConf, "10.1.0." + std::to_string(p + 1) + "-own")["driver"] == Value(p, last));
-        tally.Check(ReadSection(kConf, "10.1.1.1-shared")[kNetKeys[p]] == Value(p, last));
+        tally.Check(ReadSection(kConf, "10.1.1.1-shared")[kOwnedKeys[p].szNetKey] == Value(p, last));
     }
     // The account is one process's last, whole: its own password.
     PrinterGoogleInfo cloud;

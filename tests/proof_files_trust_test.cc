@@ -51,22 +51,13 @@ void PlugPrinter() {
     SetUsblp("lp0", {.deviceIdReply = UsblpReply("MFG:ACME;MDL:Model 100;")});
 }
 
-UsbPrinterConf UsbRecord() {
-    UsbPrinterConf conf;
-    std::memset(&conf, 0, sizeof conf);
-    std::strcpy(conf.szPrinterId, kPrinter);
+UsbPrinterConf UsbSetupRecord() {
+    UsbPrinterConf conf = UsbRecord(kPrinter);
     std::strcpy(conf.szDriver, "drv.ppd");
     return conf;
 }
 
-PrinterGoogleInfo Cloud(const char *szPassword, const char *szToken) {
-    PrinterGoogleInfo info;
-    std::memset(&info, 0, sizeof info);
-    std::strcpy(info.szAccount, "owner@example.com");
-    std::snprintf(info.szPassword, sizeof info.szPassword, "%s", szPassword);
-    std::snprintf(info.szRefreshToken, sizeof info.szRefreshToken, "%s", szToken);
-    return info;
-}
+PrinterGoogleInfo Cloud(const char *szPassword) { return CloudRecord("owner@example.com", szPassword, ""); }
 
 // ---- symlinks -------------------------------------------------------------
 
@@ -79,11 +70,11 @@ struct LinkCase {
 };
 const LinkCase kLinkCases[] = {
     {kConf, [] {
-         const UsbPrinterConf usb = UsbRecord();
+         const UsbPrinterConf usb = UsbSetupRecord();
          XAVOPrinterConfSetup(&usb, 0);
          const NetPrinterConf net = NetRecord();
          XAVOPrinterNetConfSetup(&net, 0);
-         const PrinterGoogleInfo cloud = Cloud("pw", "");
+         const PrinterGoogleInfo cloud = Cloud("pw");
          XAVOPrinterGoogleInfoSet(&cloud);
      }},
     {kNptab, [] {
@@ -110,7 +101,7 @@ const LinkCase kLinkCases[] = {
      }},
     {kCupsConf, [] { XAVOPrinterCupsUsbConfRmAll(); }},
     {"/run/xavosdk/lock/lock_printer", [] {
-         const UsbPrinterConf usb = UsbRecord();
+         const UsbPrinterConf usb = UsbSetupRecord();
          XAVOPrinterConfSetup(&usb, 0);
      }},
     {"/run/xavosdk/lock/LOCK_USBIDMAP", [] {
@@ -122,7 +113,7 @@ const LinkCase kLinkCases[] = {
          XAVOPrinterEnableExt(1, "lp0", "1-1");
      }},
     {"/usr/xavo/etc/.printer.conf.lock", [] {
-         const UsbPrinterConf usb = UsbRecord();
+         const UsbPrinterConf usb = UsbSetupRecord();
          XAVOPrinterConfSetup(&usb, 0);
      }},
     {"/usr/xavo/etc/.nptab.lock", [] {
@@ -134,7 +125,7 @@ const LinkCase kLinkCases[] = {
          XAVOPrinterNetUpdateConf(1, &net);
      }},
     {"/usr/xavo/etc/.printer_secret.key", [] {
-         const PrinterGoogleInfo cloud = Cloud("pw", "");
+         const PrinterGoogleInfo cloud = Cloud("pw");
          XAVOPrinterGoogleInfoSet(&cloud);
      }},
 };
