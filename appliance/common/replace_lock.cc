@@ -44,17 +44,11 @@ bool IsOurLockFile(const struct stat &st, bool bShared) {
 // (a link, a socket, another user's file).
 bool IsSomethingElse(int error) { return error == ELOOP || error == EACCES || error == EPERM || error == ENXIO; }
 
-bool StillNamed(int fd, const std::string &path) {
-    struct stat held {}, named {};
-    return ::fstat(fd, &held) == 0 && ::lstat(path.c_str(), &named) == 0 && held.st_dev == named.st_dev &&
-           held.st_ino == named.st_ino;
-}
-
 // Puts a new lock file at the name of a planted one and removes the planted
 // one, without ever removing a good lock file that another writer made
 // there meanwhile: the new file is swapped in (RENAME_EXCHANGE) and what
 // came out is looked at under the private name; a good lock file goes back.
-// The new file is locked from its birth, so that nobody takes it for the
+// The new file stays locked throughout, so that nobody takes it for the
 // lock while it may still go.  Its descriptor, in place; -1 with EAGAIN
 // when the name is to be looked at again.
 int SwapOutPlanted(const std::string &lockPath) {

@@ -8,7 +8,6 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <ctime>
 #include <memory>
 #include <string_view>
 
@@ -23,14 +22,8 @@ constexpr char kNameChars[] = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvw
 constexpr size_t kNameCharCount = sizeof kNameChars - 1;
 constexpr mode_t kTempMode = 0600;
 // Names tried before giving up; each is one of 62^6, so only a directory
-// full of planted names runs out of them.
+// full of planted names, or sweeps taking every new file, run out of them.
 constexpr int kNameTries = 64;
-// Where the file system has no unnamed files (O_TMPFILE), a temporary file
-// gets its name before its lock.  It is made with no permission bits and
-// given 0600 once locked, so that an unlocked file without bits is one
-// between those two steps, or one whose writer was killed there: the latter
-// only once it is older than any writer takes for two system calls.
-constexpr time_t kUnbornSeconds = 60;
 
 bool EndsWithXs(std::string_view path) {
     return path.size() >= kXCount && path.substr(path.size() - kXCount) == kXs;
@@ -49,36 +42,6 @@ bool RandomName(char *pXs) {
     return true;
 }
 
-// Gives the unnamed file its name; fails with EEXIST when the name is taken.
-bool LinkUnnamed(int fd, const char *szPath) {
-    if (::linkat(fd, "", AT_FDCWD, szPath, AT_EMPTY_PATH) == 0) return true;
-    if (errno == EEXIST) return false;
-    // Kernels before 6.10 allow AT_EMPTY_PATH only with CAP_DAC_READ_SEARCH;
-    // the descriptor's /proc link does the same for anybody.
-    std::string self = "/proc/self/fd/" + std::to_string(fd);
-    return ::linkat(AT_FDCWD, self.c_str(), AT_FDCWD, szPath, AT_SYMLINK_FOLLOW) == 0;
-}
-
-// The fallback of file systems without unnamed files: see kUnbornSeconds.
-int CreateNamedThenLock(std::string *pTemplate) {
-    std::string &name = *pTemplate;
-    for (int i = 0; i < kNameTries; ++i) {
-        if (!RandomName(&name[name.size() - kXCount])) return -1;
-        Fd fd(::open(name.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC | O_NOCTTY, 0));
-        if (fd.get() < 0) {
-            if (errno == EEXIST) continue;
-            return -1;
-        }
-        if (TryLockExclusive(fd.get()) && ::fchmod(fd.get(), kTempMode) == 0) return fd.release();
-        int saved = errno;
-        ::unlink(name.c_str());
-        errno = saved;
-        return -1;
-    }
-    errno = EEXIST;
-    return -1;
-}
-
 // Whether the name is the template's prefix and six letters and digits.
 bool IsTempOf(std::string_view name, std::string_view prefix) {
     if (name.size() != prefix.size() + kXCount || name.substr(0, prefix.size()) != prefix) return false;
@@ -95,7 +58,6 @@ void RemoveIfStale(int dirFd, const char *szName) {
     struct stat st {};
     if (::fstat(fd.get(), &st) != 0 || !S_ISREG(st.st_mode) || st.st_uid != ::geteuid() || st.st_nlink != 1) return;
     if (!TryLockExclusive(fd.get())) return;  // a live writer's
-    if ((st.st_mode & 07777) == 0 && std::time(nullptr) - st.st_ctime < kUnbornSeconds) return;
     // The name must still be the file examined: only a locked file is ever
     // removed, never whatever took its name meanwhile.
     struct stat now {};
@@ -132,25 +94,30 @@ std::string BaseName(const std::string &path) {
     return slash == std::string::npos ? path : path.substr(slash + 1);
 }
 
+bool StillNamed(int fd, const std::string &path) {
+    struct stat held {}, named {};
+    return ::fstat(fd, &held) == 0 && ::lstat(path.c_str(), &named) == 0 && held.st_dev == named.st_dev &&
+           held.st_ino == named.st_ino;
+}
+
 int CreateLockedTemp(std::string *pTemplate) {
     std::string &name = *pTemplate;
     if (!EndsWithXs(name)) {
         errno = EINVAL;
         return -1;
     }
-    // An unnamed file is locked before it gets its name, so that no sweep
-    // ever sees it unlocked while its writer lives.
-    Fd fd(::open(DirName(name).c_str(), O_TMPFILE | O_WRONLY | O_CLOEXEC, kTempMode));
-    if (fd.get() < 0) {
-        if (errno == EOPNOTSUPP || errno == EISDIR || errno == EINVAL) return CreateNamedThenLock(pTemplate);
-        return -1;
-    }
-    // fchmod: the process's umask must not make it look unborn.
-    if (!TryLockExclusive(fd.get()) || ::fchmod(fd.get(), kTempMode) != 0) return -1;
     for (int i = 0; i < kNameTries; ++i) {
         if (!RandomName(&name[name.size() - kXCount])) return -1;
-        if (LinkUnnamed(fd.get(), name.c_str())) return fd.release();
-        if (errno != EEXIST) return -1;
+        Fd fd(::open(name.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC | O_NOCTTY, kTempMode));
+        if (fd.get() < 0) {
+            if (errno == EEXIST) continue;
+            return -1;
+        }
+        // Between the open and the lock, a sweep of the template may take
+        // the new file for a killed writer's: it then holds the lock, or
+        // has removed the name.  Such a file is left to the sweep, and the
+        // writer makes another.
+        if (TryLockExclusive(fd.get()) && StillNamed(fd.get(), name)) return fd.release();
     }
     errno = EEXIST;
     return -1;

@@ -2,11 +2,13 @@
 // writers killed before their rename leave behind.
 //
 // Every such temporary file is locked (flock, exclusive) by its writer from
-// the moment its name exists until the writer closes it, which it does only
-// after the rename.  A temporary file of a template that nobody holds a lock
-// on therefore belongs to a writer that is gone: the kernel dropped the lock
-// with the killed writer's descriptors.  That rule needs no lock of its own,
-// so it serves the writers that replace a file without one (the CUPS
+// its making until the writer closes it, which it does only after the
+// rename.  A temporary file of a template that nobody holds a lock on
+// therefore belongs to a writer that is gone (the kernel dropped the lock
+// with the killed writer's descriptors), or to one that has just made it
+// and not locked it yet: such a writer finds, once it holds the lock, that
+// its file lost its name, and makes another.  The rule needs no lock of its
+// own, so it serves the writers that replace a file without one (the CUPS
 // printers.conf edit) as well as those that hold the file's write lock.
 #pragma once
 
@@ -31,6 +33,8 @@ void RemoveStaleTemps(const std::string &tmpl);
 
 // One attempt at an exclusive flock, not waiting for a holder.
 bool TryLockExclusive(int fd);
+// Whether the path still names the open file (a link at it does not).
+bool StillNamed(int fd, const std::string &path);
 
 // The directory part and the last component of a path.
 std::string DirName(const std::string &path);
