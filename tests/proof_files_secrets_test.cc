@@ -117,7 +117,7 @@ TEST(FileSecretProofs, SecretsNeverShowInClearAndDamagedOnesNeverOpen) {
             if (!tally.Check(!Opens(damaged))) ADD_FAILURE() << "opened: " << damaged;
         }
     }
-    // Through the library, as the tampering did it: bit 7 flipped
+    // Through the library, as a tamperer would do it: bit 7 flipped
     // at every position of the stored password, and the password cut by one.
     TakeLogs();
     int refused = 0;
