@@ -1,4 +1,5 @@
 #include <syslog.h>
+#include <unistd.h>
 
 #include <cstdio>
 #include <cstring>
@@ -76,16 +77,18 @@ XAVO_EXPORT int32_t XAVOPrinterCupsUsbConfRmAll(void) noexcept {
             return -1;
         }
         // A write that fails only when the buffer goes out (a full disk)
-        // must not let a cut copy replace the scheduler's file.
-        bool bWritten = std::fflush(temp.get()) == 0;
-        bWritten = std::fclose(temp.release()) == 0 && bWritten;
+        // must not let a cut copy replace the scheduler's file, nor may a
+        // power cut after the rename leave it empty.
         source.reset();
-        if (!bWritten) {
+        if (std::fflush(temp.get()) != 0 || std::ferror(temp.get()) || ::fsync(::fileno(temp.get())) != 0) {
             XSETERR(ERR_WRITE);
             return -1;
         }
         // rename() puts the new file in place in one step: a failed rename
-        // leaves the old file whole.
+        // leaves the old file whole.  The stream stays open until then: the
+        // platform keeps a temporary file locked while it is open, which is
+        // how the next edit tells this one from the leftovers of an edit
+        // that was killed, and removes only those.
         if (std::rename(szTemp, kPrintersConf) != 0) {
             XSETERR(ERR_RENAME);
             return -1;

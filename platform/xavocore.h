@@ -66,7 +66,12 @@ void ORLICSzHashFree(ORLICSzHash *pHash);
  * between the first "[" and the last "]" of its header line.  Writers
  * replace the file atomically (an existing file keeps its mode and owner;
  * a symlink at the path is refused, never followed) and touch no other
- * section.  A control character in a value is written as a blank; a
+ * section.  Writers of key-value files alike hold the file's write lock
+ * (flock on "." name ".lock" beside it) from their read to their replace,
+ * so that writers in several processes lose nothing; readers take none.
+ * In a directory others can write to (/tmp), a file that is not root's
+ * (another owner, writable by others, a link, a FIFO) reads as missing and
+ * is replaced by root's own 0644 file.  A control character in a value is written as a blank; a
  * section name or key holding one is refused (negative, ERR_BAD_PARAMETERS).
  *
  * GetSection: the number of key lines read into the hash; negative when the
@@ -105,7 +110,11 @@ int32_t ORLICFileSetKeyValue(const char *szPath, const char *szKey, const char *
 int32_t ORLICFileRemoveKey(const char *szPath, const char *szKey);
 int32_t ORLICFileGetPair(const char *szPath, ORLICSzHash **ppHash);
 
-/* ---- files and locks ---- */
+/* ---- files and locks ----
+ * TempFileOpen: a new 0600 file named by the template, locked (flock) for
+ * as long as the stream is open; rename it into place before closing the
+ * stream.  Files of the same template that nobody holds were left by
+ * writers killed before their rename, and are removed first. */
 int32_t ORLICFileExist(const char *szPath);
 FILE *ORLICFileTempFileOpen(char *szTemplate);
 int32_t ORLICFileLockByFile(const char *szPath, int32_t iFlags, int32_t *pfdLock);

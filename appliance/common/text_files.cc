@@ -9,6 +9,8 @@
 #include <cstring>
 
 #include "common/fd.h"
+#include "common/replace_lock.h"
+#include "common/temp_files.h"
 
 namespace xavo::platform {
 namespace {
@@ -52,16 +54,38 @@ bool WriteAll(int fd, std::string_view data) {
     return true;
 }
 
-std::string DirName(const std::string &path) {
-    size_t slash = path.rfind('/');
-    if (slash == std::string::npos) return ".";
-    if (slash == 0) return "/";
-    return path.substr(0, slash);
+// Whether a file that fails the trust of a shared directory is in one: it
+// is then ignored by readers and replaced by writers.  The directory is
+// looked at only for such files, so root's ordinary files cost nothing.
+bool Untrusted(const char *szPath, const struct stat &st) {
+    return !IsTrustedFile(st) && IsSharedDirectory(DirName(szPath));
 }
 
-std::string BaseName(const std::string &path) {
-    size_t slash = path.rfind('/');
-    return slash == std::string::npos ? path : path.substr(slash + 1);
+// The file that a replacement takes the place of.  *pbKeep: its mode and
+// owner go to the new file.  False, with the failure, when the path must
+// not be replaced.
+bool ExistingFile(const char *szPath, struct stat *pOld, bool *pbKeep, Failure *pFailure) {
+    *pbKeep = false;
+    if (::lstat(szPath, pOld) != 0) {
+        if (errno == ENOENT) return true;
+        *pFailure = {kErrOpen, __LINE__};
+        return false;
+    }
+    // In a shared directory (/tmp) anybody may have put a file, a link or a
+    // FIFO at the path before root wrote it: it is not root's, and root's
+    // new file takes its place, owned by root with the appliance's mode.
+    // rename() replaces whatever is at the path without following it.
+    if (Untrusted(szPath, *pOld)) return true;
+    // Elsewhere a link is refused rather than replaced: in root's own
+    // directories it is an administrator's deliberate arrangement, not to
+    // be silently broken or followed by a root process.
+    if (!S_ISREG(pOld->st_mode)) {
+        errno = S_ISLNK(pOld->st_mode) ? ELOOP : EINVAL;
+        *pFailure = {kErrOpen, __LINE__};
+        return false;
+    }
+    *pbKeep = true;
+    return true;
 }
 
 // Reads to the end into one block of the size fstat gave (plus the byte
@@ -99,9 +123,17 @@ ReadResult ReadTextFile(const char *szPath, std::string *pText) {
     // O_NONBLOCK: a FIFO planted at the path must not hang the reader; it is
     // refused below like any other non-regular file.
     Fd fd(::open(szPath, O_RDONLY | O_NOFOLLOW | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
+    if (fd.get() < 0 && errno == ELOOP && IsSharedDirectory(DirName(szPath))) return ReadResult::kMissing;
     if (fd.get() < 0) return errno == ENOENT ? ReadResult::kMissing : ReadResult::kFailed;
     struct stat st {};
     if (::fstat(fd.get(), &st) != 0) return ReadResult::kFailed;
+    // Every file the platform reads in a shared directory ("/tmp/usbtab",
+    // "/tmp/usbip_*") is written by root's services; one that is not
+    // root's is somebody else's plant and reads as missing, for the readers
+    // of the tables (the USB library's listing, ORLICFileGetKeyValue,
+    // ORLICFileGetPair, the section readers) and for the writers, which
+    // then replace it.
+    if (Untrusted(szPath, st)) return ReadResult::kMissing;
     if (!S_ISREG(st.st_mode) || st.st_size > kMaxFileSize) {
         errno = S_ISREG(st.st_mode) ? EFBIG : EINVAL;
         return ReadResult::kFailed;
@@ -115,56 +147,43 @@ ReadResult ReadTextFile(const char *szPath, std::string *pText) {
 bool ReplaceFile(const char *szPath, std::string_view content, Failure *pFailure) {
     const std::string path(szPath);
     struct stat old {};
-    bool bExists = false;
-    if (::lstat(szPath, &old) == 0) {
-        // Refusing a symlink rather than replacing it: a link at one of
-        // these paths is either planted (in /tmp) or an administrator's
-        // deliberate arrangement, and neither should be silently broken or
-        // followed by a root process.  rename() below replaces whatever is
-        // at the path without following it, so a link planted after this
-        // check is replaced, never written through.
-        if (!S_ISREG(old.st_mode)) {
-            errno = S_ISLNK(old.st_mode) ? ELOOP : EINVAL;
-            *pFailure = {kErrOpen, __LINE__};
-            return false;
-        }
-        bExists = true;
-    } else if (errno != ENOENT) {
-        *pFailure = {kErrOpen, __LINE__};
-        return false;
-    }
+    bool bKeep = false;
+    if (!ExistingFile(szPath, &old, &bKeep, pFailure)) return false;
 
     // Same directory, so that the rename stays within one file system and
-    // is atomic; hidden, so that directory listings do not pick it up.  A
-    // writer killed before the rename leaves its temporary file behind; it
-    // is not cleaned up later because nobody can tell it from the one a
-    // live writer is filling.
+    // is atomic; hidden, so that directory listings do not pick it up.
+    // Writers hold the file's write lock (replace_lock.h), and every
+    // temporary file is locked by its writer until its rename: one of this
+    // file's that nobody holds was left by a writer killed before its
+    // rename, and goes now.  So at most one (the last killed writer's) is
+    // ever left.
     std::string tmpl = DirName(path) + "/." + BaseName(path) + ".XXXXXX";
-    Fd fd(::mkostemp(tmpl.data(), O_CLOEXEC));
+    RemoveStaleTemps(tmpl);
+    Fd fd(CreateLockedTemp(&tmpl));
     if (fd.get() < 0) {
         *pFailure = {kErrOpen, __LINE__};
         return false;
     }
-    TempFile temp(tmpl);
+    TempFile temp(tmpl);  // removed, while still locked, unless renamed
 
     if (!WriteAll(fd.get(), content)) {
         *pFailure = {kErrWrite, __LINE__};
         return false;
     }
-    // mkstemp made the file 0600; the replacement takes the old file's
+    // The temporary file is 0600; the replacement takes the old file's
     // mode (Samba and CUPS read some of these files as other users).
-    if (::fchmod(fd.get(), bExists ? (old.st_mode & 07777) : kNewFileMode) != 0) {
+    if (::fchmod(fd.get(), bKeep ? (old.st_mode & 07777) : kNewFileMode) != 0) {
         *pFailure = {kErrWrite, __LINE__};
         return false;
     }
-    if (bExists && (old.st_uid != ::geteuid() || old.st_gid != ::getegid()) &&
+    if (bKeep && (old.st_uid != ::geteuid() || old.st_gid != ::getegid()) &&
         ::fchown(fd.get(), old.st_uid, old.st_gid) != 0 && errno != EPERM) {
         *pFailure = {kErrWrite, __LINE__};
         return false;
     }
     // The data must be on disk before the rename makes it the file, or a
     // power cut could leave an empty file under the real name.
-    if (::fsync(fd.get()) != 0 || fd.Close() != 0) {
+    if (::fsync(fd.get()) != 0) {
         *pFailure = {kErrWrite, __LINE__};
         return false;
     }

@@ -19,6 +19,8 @@ enum class ReadResult { kOk, kMissing, kFailed };
 // Reads a whole regular file.  A symlink at the path is never followed (the
 // appliance keeps some of these files in /tmp, where anybody can plant one)
 // and neither is a FIFO or device opened for reading: both are kFailed.
+// In a shared directory such as /tmp, a file that is not root's (see
+// IsTrustedFile) reads as kMissing: it was planted, and root ignores it.
 ReadResult ReadTextFile(const char *szPath, std::string *pText);
 
 // Replaces the file's content atomically: a temporary file in the same
@@ -26,8 +28,10 @@ ReadResult ReadTextFile(const char *szPath, std::string *pText);
 // a reader or a writer killed half way sees the old or the new content,
 // never a torn one.  An existing file keeps its mode and owner; a new one
 // gets 0644.  A symlink (or anything but a regular file) at the path is
-// refused, never written through.  On failure the file is unchanged and
-// *pFailure tells the code and line to report.
+// refused, never written through; in a shared directory such as /tmp, such
+// a thing or a file that is not root's is replaced by root's own 0644 file.
+// The caller holds the file's write lock (replace_lock.h).  On failure the
+// file is unchanged and *pFailure tells the code and line to report.
 bool ReplaceFile(const char *szPath, std::string_view content, Failure *pFailure);
 
 // The two above for an exported operation of the stand-ins, which report

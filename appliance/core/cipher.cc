@@ -131,6 +131,32 @@ bool CreateKey(Failure *pFailure) {
     return bOk;
 }
 
+bool IsAlphabetChar(char c) {
+    return (c >= 'A' && c <= 'Z') || (c >= 'a' && c <= 'z') || (c >= '0' && c <= '9') || c == '-' || c == '_';
+}
+
+// The sealed box of an enciphered text, only when the text is exactly what
+// the cipher writes for it.  libsodium's decoder is lenient (1.0.18 reads
+// bytes 0x80-0xFF as "_", and the last character's unused bits are not
+// looked at), so a changed text could decode to the original box and open;
+// every character is checked against the alphabet first, and the box must
+// encode back to the very text.
+bool DecodeExact(const char *szText, std::vector<unsigned char> *pBox) {
+    const size_t len = std::strlen(szText);
+    for (size_t i = 0; i < len; ++i) {
+        if (!IsAlphabetChar(szText[i])) return false;
+    }
+    std::vector<unsigned char> box(len + 1);  // decoded is shorter than its text
+    size_t n = 0;
+    if (sodium_base642bin(box.data(), box.size(), szText, len, nullptr, &n, nullptr, kBase64) != 0) return false;
+    box.resize(n);
+    std::string again(sodium_base64_ENCODED_LEN(n, kBase64), '\0');
+    sodium_bin2base64(again.data(), again.size(), box.data(), n, kBase64);
+    if (std::strcmp(again.c_str(), szText) != 0) return false;
+    *pBox = std::move(box);
+    return true;
+}
+
 bool LoadKey(Key *pKey, bool bCreate, Failure *pFailure) {
     if (sodium_init() < 0) {
         *pFailure = {kErrOpen, __LINE__};
@@ -184,11 +210,8 @@ XAVO_PLATFORM_API int32_t ORLICCryptSzDecrypt(const char *szCipher, char *szOut,
     }
     szOut[0] = '\0';
     return XAVO_GUARD(int32_t{0}, [&] {
-        size_t len = std::strlen(szCipher);
-        std::vector<unsigned char> box(len + 1);  // decoded is shorter than its text
-        size_t sealed = 0;
-        if (sodium_base642bin(box.data(), box.size(), szCipher, len, nullptr, &sealed, nullptr, kBase64) != 0 ||
-            sealed < kOverhead) {
+        std::vector<unsigned char> box;
+        if (!DecodeExact(szCipher, &box) || box.size() < kOverhead) {
             SetError(kErrRead, kUnit, __LINE__);
             return int32_t{0};
         }
@@ -198,6 +221,7 @@ XAVO_PLATFORM_API int32_t ORLICCryptSzDecrypt(const char *szCipher, char *szOut,
             SetError(failure.code, kUnit, failure.line);
             return int32_t{0};
         }
+        const size_t sealed = box.size();
         size_t clear = sealed - kOverhead;
         Secret text(clear + 1);
         if (crypto_secretbox_open_easy(text.bytes.data(), box.data() + crypto_secretbox_NONCEBYTES,

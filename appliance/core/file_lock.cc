@@ -4,16 +4,18 @@
 #include <pthread.h>
 #include <sys/file.h>
 #include <sys/stat.h>
-#include <time.h>
 #include <unistd.h>
 
 #include <cerrno>
+#include <chrono>
 #include <cstring>
 #include <map>
 #include <mutex>
 #include <string>
 
 #include "common/appliance.h"
+#include "common/pause.h"
+#include "common/temp_files.h"
 #include "core/internal.h"
 
 using namespace xavo::platform;
@@ -114,24 +116,6 @@ int TryLockFile(const char *szPath, bool bExclusive) {
     return fd;
 }
 
-timespec Now() {
-    timespec ts{};
-    clock_gettime(CLOCK_MONOTONIC, &ts);
-    return ts;
-}
-
-bool Before(const timespec &a, const timespec &b) {
-    return a.tv_sec < b.tv_sec || (a.tv_sec == b.tv_sec && a.tv_nsec < b.tv_nsec);
-}
-
-// clock_nanosleep, not sleep()/usleep(): the waiting is the platform's own
-// and must not look like the caller's.
-void Pause(long ns) {
-    timespec ts{0, ns};
-    while (clock_nanosleep(CLOCK_MONOTONIC, 0, &ts, &ts) == EINTR) {
-    }
-}
-
 }  // namespace
 
 XAVO_PLATFORM_API int32_t ORLICFileExist(const char *szPath) {
@@ -149,21 +133,30 @@ XAVO_PLATFORM_API FILE *ORLICFileTempFileOpen(char *szTemplate) {
         return nullptr;
     }
     // 0600, as mkstemp makes it; close-on-exec, so that programs the caller
-    // starts meanwhile do not hold the file open.
-    int fd = ::mkostemp(szTemplate, O_CLOEXEC);
-    if (fd < 0) {
-        SetError(kErrOpen, kUnit, __LINE__);
-        return nullptr;
-    }
-    FILE *pFile = ::fdopen(fd, "w");
-    if (pFile == nullptr) {
-        int saved = errno;
-        ::unlink(szTemplate);
-        ::close(fd);
-        errno = saved;
-        SetError(kErrOpen, kUnit, __LINE__);
-    }
-    return pFile;
+    // starts meanwhile do not hold the file open.  The file stays locked
+    // while the stream is open, which tells other writers of the template
+    // that it is being filled: the caller renames it into place before it
+    // closes the stream.  Those of the template that nobody holds were left
+    // by writers killed before their rename, and go first.
+    return XAVO_GUARD(static_cast<FILE *>(nullptr), [&]() -> FILE * {
+        std::string name(szTemplate);
+        RemoveStaleTemps(name);
+        int fd = CreateLockedTemp(&name);
+        if (fd < 0) {
+            SetError(kErrOpen, kUnit, __LINE__);
+            return nullptr;
+        }
+        std::memcpy(szTemplate, name.data(), len);
+        FILE *pFile = ::fdopen(fd, "w");
+        if (pFile == nullptr) {
+            int saved = errno;
+            ::unlink(szTemplate);
+            ::close(fd);
+            errno = saved;
+            SetError(kErrOpen, kUnit, __LINE__);
+        }
+        return pFile;
+    });
 }
 
 // 1 with *pfdLock set when the lock was taken; 0 when another holder has it
@@ -201,8 +194,7 @@ XAVO_PLATFORM_API int32_t ORLICFileLock(uint32_t uLockAndFlags, int32_t iTimeout
     uint32_t op = uLockAndFlags & ~kLockIdMask;
     bool bExclusive = (op & kLockOpExclusive) != 0 || (op & kLockOpShared) == 0;
     return XAVO_GUARD(int32_t{-1}, [&] {
-        timespec deadline = Now();
-        deadline.tv_sec += iTimeout;
+        const Deadline deadline{std::chrono::seconds(iTimeout)};
         HeldLocks &held = Held();
         for (;;) {
             {
@@ -225,7 +217,7 @@ XAVO_PLATFORM_API int32_t ORLICFileLock(uint32_t uLockAndFlags, int32_t iTimeout
                     }
                 }
             }
-            if (!Before(Now(), deadline)) break;
+            if (deadline.Passed()) break;
             Pause(kLockRetryNs);
         }
         SetError(kErrLock, kUnit, __LINE__);

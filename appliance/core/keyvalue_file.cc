@@ -3,12 +3,14 @@
 //
 // A key set twice reads as its last value, as a shell reading the file
 // would see it; setting a key leaves exactly one line for it.  Writing
-// changes only the key's line and replaces the file atomically.
+// changes only the key's line and replaces the file atomically, holding
+// the file's write lock from the read on (replace_lock.h).
 #include <algorithm>
 #include <cstring>
 #include <string>
 #include <vector>
 
+#include "common/replace_lock.h"
 #include "common/text_files.h"
 #include "core/containers.h"
 
@@ -72,7 +74,7 @@ XAVO_PLATFORM_API int32_t ORLICFileSetKeyValue(const char *szPath, const char *s
         SetError(kErrBadParameters, kUnit, __LINE__);
         return -1;
     }
-    return XAVO_GUARD(int32_t{-1}, [&] {
+    return XAVO_GUARD_WRITE(szPath, int32_t{-1}, [&] {
         // A missing file is created: the USB printer table is gone after
         // every restart until its first entry is set.
         std::string text;
@@ -101,7 +103,7 @@ XAVO_PLATFORM_API int32_t ORLICFileRemoveKey(const char *szPath, const char *szK
         SetError(kErrBadParameters, kUnit, __LINE__);
         return -1;
     }
-    return XAVO_GUARD(int32_t{-1}, [&] {
+    return XAVO_GUARD_WRITE(szPath, int32_t{-1}, [&] {
         std::string text;
         if (!LoadTextFile(szPath, true, &text, kUnit, __LINE__)) return int32_t{-1};
         std::vector<std::string> lines = SplitLines(text);

@@ -12,6 +12,7 @@
 #include <string>
 #include <vector>
 
+#include "common/replace_lock.h"
 #include "common/text_files.h"
 #include "core/containers.h"
 #include "core/section_document.h"
@@ -106,7 +107,7 @@ XAVO_PLATFORM_API int32_t ORLICFileAddSection(const char *szPath, const char *sz
         SetError(kErrBadParameters, kUnit, __LINE__);
         return -1;
     }
-    return XAVO_GUARD(int32_t{-1}, [&] {
+    return XAVO_GUARD_WRITE(szPath, int32_t{-1}, [&] {
         DocumentPtr doc = LoadSectionDocument(szPath, true, kUnit, __LINE__);
         if (!doc) return int32_t{-1};
         if (!doc->Named(szSection).empty()) return int32_t{0};
@@ -128,7 +129,7 @@ XAVO_PLATFORM_API int32_t ORLICFileSetSection(const char *szPath, const char *sz
         SetError(kErrBadParameters, kUnit, __LINE__);
         return -1;
     }
-    return XAVO_GUARD(int32_t{-1}, [&] {
+    return XAVO_GUARD_WRITE(szPath, int32_t{-1}, [&] {
         DocumentPtr doc = LoadSectionDocument(szPath, true, kUnit, __LINE__);
         if (!doc) return int32_t{-1};
         // Renaming onto another existing section would merge two printers'
@@ -181,7 +182,7 @@ XAVO_PLATFORM_API int32_t ORLICFileSetSectionValue(const char *szPath, const cha
         SetError(kErrBadParameters, kUnit, __LINE__);
         return -1;
     }
-    return XAVO_GUARD(int32_t{-1}, [&] {
+    return XAVO_GUARD_WRITE(szPath, int32_t{-1}, [&] {
         // Only an existing section gets the key: a section made up here
         // would be a record of a printer nobody set up.
         auto doc = LoadWithSection(szPath, szSection, __LINE__);

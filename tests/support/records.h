@@ -24,4 +24,22 @@ inline NetPrinterConf NetRecord(const char *szIP = "10.0.0.5", const char *szNam
     return conf;
 }
 
+// A USB printer's record with only its printer ID filled.
+inline UsbPrinterConf UsbRecord(const char *szPrinterId) {
+    UsbPrinterConf conf;
+    std::memset(&conf, 0, sizeof conf);
+    std::snprintf(conf.szPrinterId, sizeof conf.szPrinterId, "%s", szPrinterId);
+    return conf;
+}
+
+// The cloud print account with one secret or both.
+inline PrinterGoogleInfo CloudRecord(const char *szAccount, const char *szPassword, const char *szToken) {
+    PrinterGoogleInfo info;
+    std::memset(&info, 0, sizeof info);
+    std::snprintf(info.szAccount, sizeof info.szAccount, "%s", szAccount);
+    std::snprintf(info.szPassword, sizeof info.szPassword, "%s", szPassword);
+    std::snprintf(info.szRefreshToken, sizeof info.szRefreshToken, "%s", szToken);
+    return info;
+}
+
 }  // namespace xavo::test

@@ -1,0 +1,26 @@
+// The figure a proof prints: how many cases it tried and how many failed,
+// as one line "NAME: N tried, M failed".
+#pragma once
+
+#include <cstdio>
+
+namespace xavo::test {
+
+struct Tally {
+    const char *szName;
+    int tried = 0;
+    int failed = 0;
+
+    // Counts one case; its outcome, for the test's own assertion.
+    bool Check(bool bOk) {
+        ++tried;
+        if (!bOk) ++failed;
+        return bOk;
+    }
+    void Print() const {
+        std::printf("%s: %d tried, %d failed\n", szName, tried, failed);
+        std::fflush(stdout);
+    }
+};
+
+}  // namespace xavo::test
