@@ -16,6 +16,10 @@ if [ "$(id -u)" -ne 0 ]; then
     exit 1
 fi
 
+# clang builds the sanitized test variant and the fuzz targets;
+# libclang-rt-14-dev brings libFuzzer and clang's sanitizer runtimes, llvm-14
+# the symbolizer that puts function names and lines in their reports.
+#
 # snmp-mibs-downloader is left out on purpose: it fetches the MIBs from the
 # network at install time.  The tests hand snmpwalk the few MIB definitions
 # they use.
@@ -24,7 +28,8 @@ samba-common-bin iproute2 iputils-ping
 cups cups-client cups-bsd
 snmp snmpd
 avahi-daemon avahi-utils dbus
-psmisc procps"
+psmisc procps
+clang libclang-rt-14-dev llvm-14"
 
 missing=""
 for p in $PACKAGES; do
