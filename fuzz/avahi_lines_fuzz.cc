@@ -49,12 +49,17 @@ void CheckTxt(std::string_view txt) {
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
-    xavo::fuzz::ForEachToolLine(xavo::fuzz::AsText(data, size), kTextBuffer, [](char *szLine, std::string_view) {
-        xavo::SzList fields(ORLICSzListAlloc(kTextBuffer));
-        if (!fields || ORLICStrTok(szLine, ";", fields.addr()) < 0) std::abort();
+    // One list for the whole output, as the lookup keeps it: each split
+    // adds the line's fields behind the earlier ones.
+    xavo::SzList fields(ORLICSzListAlloc(kTextBuffer));
+    if (!fields) std::abort();
+    xavo::fuzz::ForEachToolLine(xavo::fuzz::AsText(data, size), kTextBuffer, [&](char *szLine, std::string_view) {
+        const int iFirst = xavo::ListCount(fields.get());
+        if (ORLICStrTok(szLine, ";", fields.addr()) < 0) std::abort();
         const int iCount = xavo::ListCount(fields.get());
-        for (int i = 0; i < iCount; ++i) FUZZ_CHECK(std::strchr(xavo::ListItem(fields.get(), i), ';') == nullptr);
-        if (iCount < 2) return true;
+        FUZZ_CHECK(iCount >= iFirst);
+        for (int i = iFirst; i < iCount; ++i) FUZZ_CHECK(std::strchr(xavo::ListItem(fields.get(), i), ';') == nullptr);
+        if (iCount - iFirst < 2) return true;
         CheckPort(xavo::ListItem(fields.get(), iCount - 2));
         CheckTxt(xavo::ListItem(fields.get(), iCount - 1));
         return true;
