@@ -6,7 +6,8 @@
 // the library itself writes them.  Run by "scripts/fuzz.sh --record" with
 // the corpus directory as its argument; each seed is one file named after
 // what it holds.  Inputs are laid out as each target reads them (see the
-// comment at the top of fuzz/<target>_fuzz.cc).
+// comment at the top of fuzz/<target>_fuzz.cc).  Seeds named "edge-*" are
+// written by hand: cases a fuzz run once stopped at, kept as they were.
 #include <cstdio>
 #include <cstring>
 #include <filesystem>
