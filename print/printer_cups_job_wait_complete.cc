@@ -10,6 +10,7 @@
 #include "internal/guards.h"
 #include "internal/line_reader.h"
 #include "internal/log.h"
+#include "print/lpq_lines.h"
 #include "xavoprinter.h"
 
 namespace {
@@ -47,12 +48,7 @@ Listing ListQueue(xavo::Pipe &pipe, const char *szJobId) {
         for (;;) {
             xavo::ReadStatus st = xavo::ReadLine(pipe.get(), line);
             if (st == xavo::ReadStatus::kLine) {
-                // A plain substring anywhere in the line, header lines
-                // included: a job ID that appears in a printer name or a
-                // larger job number counts as listed.  Saying "still
-                // listed" by mistake only makes the caller ask again;
-                // saying "gone" by mistake would lose track of a job.
-                if (line.find(szJobId) != std::string::npos) return Listing::kJobListed;
+                if (xavo::LpqLineListsJob(line, szJobId)) return Listing::kJobListed;
                 continue;
             }
             bReachedEnd = st == xavo::ReadStatus::kEnd && !std::ferror(pipe.get());

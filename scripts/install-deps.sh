@@ -16,6 +16,10 @@ if [ "$(id -u)" -ne 0 ]; then
     exit 1
 fi
 
+# clang builds the sanitized test variant and the fuzz targets;
+# libclang-rt-14-dev brings libFuzzer and clang's sanitizer runtimes, llvm-14
+# the symbolizer that puts function names and lines in their reports.
+#
 # snmp-mibs-downloader is left out on purpose: it fetches the MIBs from the
 # network at install time.  The tests hand snmpwalk the few MIB definitions
 # they use.
@@ -28,7 +32,8 @@ avahi-daemon avahi-utils dbus
 psmisc procps
 g++-multilib libgtest-dev:i386 libgmock-dev:i386 libsodium-dev:i386
 build-essential debhelper lintian abigail-tools
-libcli11-dev nlohmann-json3-dev python3"
+libcli11-dev nlohmann-json3-dev python3
+clang libclang-rt-14-dev llvm-14"
 
 missing=""
 for p in $PACKAGES; do
