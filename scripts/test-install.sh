@@ -25,6 +25,21 @@ fail() {
   exit 1
 }
 
+# check_operator_files DATADIR LABEL: the manual page renders and the bash
+# completion loads and offers the command's groups.
+check_operator_files() {
+  local share=$1 label=$2 page
+  page=$(find "$share/man/man1" -name 'xavoprinter.1*' 2>/dev/null | head -n 1)
+  [ -n "$page" ] || fail "$label: no manual page under $share/man/man1"
+  man -l "$page" 2>/dev/null | grep -q 'xavoprinter' || fail "$label: man does not render $page"
+  local comp=$share/bash-completion/completions/xavoprinter
+  [ -f "$comp" ] || fail "$label: no bash completion at $comp"
+  bash -c '. "$1"; COMP_WORDS=(xavoprinter ""); COMP_CWORD=1; COMP_LINE="xavoprinter "; COMP_POINT=${#COMP_LINE}
+           f=$(complete -p xavoprinter | sed "s/.*-F \([^ ]*\).*/\1/"); "$f" xavoprinter "" xavoprinter
+           printf "%s\n" "${COMPREPLY[@]}"' sh "$comp" | grep -qx usb ||
+    fail "$label: the bash completion does not offer the command's groups"
+}
+
 # check_tree STAGE PREFIX LABEL: the tree installed for PREFIX, found under
 # the staging directory STAGE ("" when installed in place).
 check_tree() {
@@ -33,6 +48,9 @@ check_tree() {
   mkdir -p "$out"
   env -u LD_LIBRARY_PATH "$root/bin/xavoprinter" --help >/dev/null ||
     fail "$label: the installed command does not start"
+  env -u LD_LIBRARY_PATH "$root/bin/xavoprinter" --version | grep -q '^xavoprinter [0-9]' ||
+    fail "$label: the installed command has no --version"
+  check_operator_files "$root/share" "$label"
   local pc
   pc=$(find "$root" -path '*/pkgconfig/xavoprinter.pc' | head -n 1)
   [ -n "$pc" ] || fail "$label: no xavoprinter.pc under $root"
@@ -84,6 +102,7 @@ build/plain/sandbox/xavo-sandbox-run /bin/sh -euc '
   cd /tmp
   env -u LD_LIBRARY_PATH xavoprinter --help >/dev/null
   xavoprinter list >/dev/null
+  man -w xavoprinter >/dev/null
   cc -std=c99 -o caller "$2" $(pkg-config --cflags --libs xavoprinter)
   ./caller' sh "$src/build/deb" "$src/tests/install/caller.c" ||
   fail "the installed packages do not work"
