@@ -200,7 +200,6 @@ std::string Big(int v) { return std::string(700, v ? 'B' : 'A'); }
 constexpr char kCupsWith[] =
     "<Printer office>\nDeviceURI socket://10.0.0.5\n</Printer>\n"
     "<Printer usbprinter1>\nDeviceURI usb:/dev/usb/lp0\n</Printer>\n";
-constexpr char kCupsWithout[] = "<Printer office>\nDeviceURI socket://10.0.0.5\n</Printer>\n";
 
 // The scheduler's file put back with its USB queue, in one step, by the test.
 void PlaceCupsWith() {
