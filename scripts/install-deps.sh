@@ -32,7 +32,7 @@ avahi-daemon avahi-utils dbus
 psmisc procps
 g++-multilib libgtest-dev:i386 libgmock-dev:i386 libsodium-dev:i386
 build-essential debhelper lintian abigail-tools
-libcli11-dev nlohmann-json3-dev python3 man-db bash-completion
+libcli11-dev nlohmann-json3-dev python3 man-db bash-completion ccache
 clang libclang-rt-14-dev llvm-14"
 
 missing=""

@@ -15,6 +15,14 @@ require_sandbox_host scripts/test.sh
 
 bash scripts/install-deps.sh
 
+# Five builds (GCC, clang with sanitizers, i386, the fuzz targets, the
+# packages) of mostly the same sources: ccache keeps a second run of the
+# command, or a run in another clone, to what changed.  CMake takes the
+# launcher from the environment; paths are hashed relative to the checkout.
+if command -v ccache >/dev/null; then
+  export CMAKE_C_COMPILER_LAUNCHER=ccache CMAKE_CXX_COMPILER_LAUNCHER=ccache CCACHE_BASEDIR=$PWD
+fi
+
 jobs=$(nproc)
 status=0
 for variant in plain asan; do
