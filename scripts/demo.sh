@@ -7,8 +7,8 @@
 # sandbox uses private mount and network namespaces (nothing reaches the
 # host's files or network, and nothing is left running).
 #
-#   sudo scripts/demo.sh            the walk-through
-#   sudo scripts/demo.sh --shell    the same, with a shell in the sandbox
+#   scripts/demo.sh            the walk-through
+#   scripts/demo.sh --shell    the same, with a shell in the sandbox
 #                                   before the clean-up steps
 set -euo pipefail
 cd "$(dirname "$0")/.."
