@@ -129,27 +129,23 @@ int Remove(const Registry &reg, const NetArgs &a) {
 void AddNetCommands(CLI::App &app, Registry &reg) {
     CLI::App *net = app.add_subcommand("net", "network printers: identify, register, remove, reach");
     auto a = std::make_shared<NetArgs>();
-    const std::string ipHelp = "the printer's IPv4 address";
-
-    CLI::App *probe = net->add_subcommand("probe", "identify a network printer by SNMP, then mDNS, then BJNP");
-    probe->add_option("IP", a->ip, ipHelp)->required()->check(IPv4());
-    reg.On(probe, "xavoprinter net probe 192.0.2.10", [&reg, a] { return Probe(reg, a->ip); });
+    reg.Leaf(net, "probe", "identify a network printer by SNMP, then mDNS, then BJNP", Arg::kIp, a->ip,
+             "xavoprinter net probe 192.0.2.10", [&reg, a] { return Probe(reg, a->ip); });
 
     AddNetAddCommand(*net, reg);
 
     CLI::App *remove = net->add_subcommand("remove", "remove a network printer's CUPS queue and table line");
-    remove->add_option("IP", a->ip, ipHelp)->required()->check(IPv4());
+    AddArg(remove, Arg::kIp, a->ip);
     remove->add_option("NAME", a->name, "its CUPS queue name")->required()->check(CupsQueueName());
     reg.On(
         remove, "xavoprinter net remove 192.0.2.10 office", [&reg, a] { return Remove(reg, *a); },
         [a] { return NetPrinterIdProblem(a->ip, a->name); });
 
-    CLI::App *ping = net->add_subcommand("ping", "whether the printer answers (Online or Offline)");
-    ping->add_option("IP", a->ip, ipHelp)->required()->check(IPv4());
-    reg.On(ping, "xavoprinter net ping 192.0.2.10", [&reg, a] { return Ping(reg, a->ip); });
+    reg.Leaf(net, "ping", "whether the printer answers (Online or Offline)", Arg::kIp, a->ip,
+             "xavoprinter net ping 192.0.2.10", [&reg, a] { return Ping(reg, a->ip); });
 
     CLI::App *check = net->add_subcommand("check", "whether a queue prints to this address, and how a queue name is used");
-    check->add_option("IP", a->ip, ipHelp)->required()->check(IPv4());
+    AddArg(check, Arg::kIp, a->ip);
     check->add_option("NAME", a->name, "a CUPS queue name")->check(CupsQueueName());
     reg.On(check, "xavoprinter net check 192.0.2.10 office", [&reg, a] { return Check(reg, *a); });
 }

@@ -174,7 +174,7 @@ void AddNetAddCommand(CLI::App &net, Registry &reg) {
     auto a = std::make_shared<AddArgs>();
     CLI::App *add = net.add_subcommand(
         "add", "register a network printer: its section, table line and CUPS queue, all or nothing");
-    add->add_option("IP", a->ip, "the printer's IPv4 address")->required()->check(IPv4());
+    AddArg(add, Arg::kIp, a->ip);
     add->add_option("NAME", a->name, "the CUPS queue name to create")->required()->check(CupsQueueName());
     add->add_option("--backend", a->backend, "CUPS backend (default socket)")
         ->check(CLI::IsMember({"socket", "lpd", "ipp", "bjnp"}));

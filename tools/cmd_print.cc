@@ -154,9 +154,8 @@ void AddPrintCommands(CLI::App &app, Registry &reg) {
         print, "xavoprinter print 04b8:0005:SN0001 report.pdf --title Report", [&reg, a] { return Print(reg, *a); },
         [a] { return a->id.empty() || a->file.empty() ? "give ID and FILE" : ""; });
 
-    CLI::App *test = print->add_subcommand("test-page", "print the CUPS test page; its handle is \"testprint\"");
-    test->add_option("ID", a->id, "printer ID")->required()->check(Text(kMaxPrinterId));
-    reg.On(test, "xavoprinter print test-page 04b8:0005:SN0001", [&reg, a] { return TestPage(reg, a->id); });
+    reg.Leaf(print, "test-page", "print the CUPS test page; its handle is \"testprint\"", Arg::kPrinterId, a->id,
+             "xavoprinter print test-page 04b8:0005:SN0001", [&reg, a] { return TestPage(reg, a->id); });
 
     CLI::App *job = app.add_subcommand("job", "print jobs");
     CLI::App *wait = job->add_subcommand(
@@ -165,7 +164,7 @@ void AddPrintCommands(CLI::App &app, Registry &reg) {
         "JOB is looked for as plain text in every line of lpq's listing, header lines included: use the handle\n"
         "'print' printed (xavo-...). A job number also matches header lines and other columns (\"1\" is found in\n"
         "\"usbprinter1 is ready\"), so such a wait may never end.");
-    wait->add_option("ID", a->id, "printer ID")->required()->check(Text(kMaxPrinterId));
+    AddArg(wait, Arg::kPrinterId, a->id);
     wait->add_option("JOB", a->file, "the job's handle (its title), as 'print' printed it")->required()->check(Text(kMaxField));
     wait->add_option("--timeout", a->timeout, "seconds to wait, 1 to 86400 (default 60)")->check(CLI::Range(1u, 86400u));
     reg.On(wait, "xavoprinter job wait 04b8:0005:SN0001 xavo-3f9a0c12 --timeout 30", [&reg, a] { return JobWait(reg, *a); });

@@ -75,9 +75,8 @@ void AddPrinterCommands(CLI::App &app, Registry &reg) {
     reg.On(list, "xavoprinter list --json", [&reg] { return List(reg); });
 
     auto id = std::make_shared<std::string>();
-    CLI::App *show = app.add_subcommand("show", "the printer's section of the printer configuration file");
-    show->add_option("ID", *id, "printer ID")->required()->check(Text(kMaxPrinterId));
-    reg.On(show, "xavoprinter show 04b8:0005:SN0001", [&reg, id] { return Show(reg, *id); });
+    reg.Leaf(&app, "show", "the printer's section of the printer configuration file", Arg::kPrinterId, *id,
+             "xavoprinter show 04b8:0005:SN0001", [&reg, id] { return Show(reg, *id); });
 }
 
 }  // namespace cli

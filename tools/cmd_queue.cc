@@ -131,30 +131,27 @@ void AddQueueCommands(CLI::App &app, Registry &reg) {
     auto a = std::make_shared<QueueArgs>();
 
     CLI::App *add = queue->add_subcommand("add", "create a USB printer's CUPS queue (left disabled)");
-    add->add_option("ID", a->id, "printer ID")->required()->check(Text(kMaxPrinterId));
+    AddArg(add, Arg::kPrinterId, a->id);
     add->add_option("--ppd", a->ppd, "PPD file to install and keep")->check(CLI::ExistingFile);
     reg.On(add, "xavoprinter queue add 04b8:0005:SN0001 --ppd /tmp/printer.ppd", [&reg, a] { return Add(reg, *a); });
 
     for (const bool bEnable : {true, false}) {
         const std::string verb = bEnable ? "enable" : "disable";
-        CLI::App *sub = queue->add_subcommand(verb, verb + " a CUPS queue");
-        sub->add_option("NAME", a->name, "CUPS queue name")->required()->check(CupsQueueName());
-        reg.On(sub, "xavoprinter queue " + verb + " usbprinter1",
-               [&reg, a, bEnable] { return Enable(reg, a->name, bEnable); });
+        reg.Leaf(queue, verb, verb + " a CUPS queue", Arg::kQueueName, a->name, "xavoprinter queue " + verb + " usbprinter1",
+                 [&reg, a, bEnable] { return Enable(reg, a->name, bEnable); });
     }
 
     CLI::App *remove = queue->add_subcommand("remove", "remove a printer's CUPS queue");
-    remove->add_option("ID", a->id, "printer ID")->required()->check(Text(kMaxPrinterId));
+    AddArg(remove, Arg::kPrinterId, a->id);
     remove->add_flag("--network", a->bNetwork, "the printer is a network printer");
     reg.On(remove, "xavoprinter queue remove 04b8:0005:SN0001", [&reg, a] { return Remove(reg, *a); });
 
-    CLI::App *ppd = queue->add_subcommand("ppd", "print the PPD file kept for a printer");
-    ppd->add_option("ID", a->id, "printer ID")->required()->check(Text(kMaxPrinterId));
-    reg.On(ppd, "xavoprinter queue ppd 04b8:0005:SN0001", [&reg, a] { return Ppd(reg, a->id); });
+    reg.Leaf(queue, "ppd", "print the PPD file kept for a printer", Arg::kPrinterId, a->id,
+             "xavoprinter queue ppd 04b8:0005:SN0001", [&reg, a] { return Ppd(reg, a->id); });
 
     CLI::App *check = queue->add_subcommand("check", "how a CUPS queue name is used");
-    check->add_option("ID", a->id, "printer ID")->required()->check(Text(kMaxPrinterId));
-    check->add_option("NAME", a->name, "CUPS queue name")->required()->check(CupsQueueName());
+    AddArg(check, Arg::kPrinterId, a->id);
+    AddArg(check, Arg::kQueueName, a->name);
     reg.On(check, "xavoprinter queue check 04b8:0005:SN0001 usbprinter1", [&reg, a] { return Check(reg, *a); });
 
     CLI::App *purge = queue->add_subcommand("purge-usb", "drop the USB queues from CUPS's printers.conf (cupsd stopped)");

@@ -122,15 +122,13 @@ void AddShareCommands(CLI::App &app, Registry &reg) {
     auto id = std::make_shared<std::string>();
     CLI::App *usbip = app.add_subcommand("usbip", "the USB/IP sharing hooks");
     for (const bool bEject : {true, false}) {
-        CLI::App *sub = usbip->add_subcommand(bEject ? "eject" : "release",
-                                              bEject ? "eject a printer from USB/IP sharing" : "release a printer's USB/IP lock");
-        sub->add_option("ID", *id, "printer ID")->required()->check(Text(kMaxPrinterId));
-        reg.On(sub, std::string("xavoprinter usbip ") + (bEject ? "eject" : "release") + " 04b8:0005:SN0001",
-               [&reg, id, bEject] { return UsbipHook(reg, *id, bEject); });
+        const std::string verb = bEject ? "eject" : "release";
+        reg.Leaf(usbip, verb, bEject ? "eject a printer from USB/IP sharing" : "release a printer's USB/IP lock",
+                 Arg::kPrinterId, *id, "xavoprinter usbip " + verb + " 04b8:0005:SN0001",
+                 [&reg, id, bEject] { return UsbipHook(reg, *id, bEject); });
     }
-    CLI::App *lock = usbip->add_subcommand("lock-status", "a printer's USB/IP lock status");
-    lock->add_option("ID", *id, "printer ID")->required()->check(Text(kMaxPrinterId));
-    reg.On(lock, "xavoprinter usbip lock-status 04b8:0005:SN0001", [&reg, id] { return UsbipLockStatus(reg, *id); });
+    reg.Leaf(usbip, "lock-status", "a printer's USB/IP lock status", Arg::kPrinterId, *id,
+             "xavoprinter usbip lock-status 04b8:0005:SN0001", [&reg, id] { return UsbipLockStatus(reg, *id); });
 }
 
 }  // namespace cli

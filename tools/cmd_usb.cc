@@ -124,15 +124,13 @@ int Reset(const Registry &reg, const std::string &dev) {
 void AddUsbCommands(CLI::App &app, Registry &reg) {
     CLI::App *usb = app.add_subcommand("usb", "USB printers on the usblp devices lp0 and lp1");
     auto a = std::make_shared<UsbArgs>();
-    const std::string devHelp = "usblp device name (lp0, lp1) or device path";
-
     CLI::App *enable = usb->add_subcommand("enable", "register a plugged-in USB printer (as the hotplug handler does)");
-    enable->add_option("DEV", a->dev, devHelp)->required()->check(Text(kMaxField));
+    AddArg(enable, Arg::kDevice, a->dev);
     enable->add_option("BUS", a->bus, "USB bus ID of the device, such as 1-1.2")->required()->check(Text(kMaxField));
     reg.On(enable, "xavoprinter usb enable lp0 1-1.2", [&reg, a] { return Enable(reg, *a); });
 
     CLI::App *disable = usb->add_subcommand("disable", "forget an unplugged USB printer, by device name and/or bus ID");
-    disable->add_option("DEV", a->dev, devHelp)->check(Text(kMaxField));
+    disable->add_option("DEV", a->dev, kDeviceHelp)->check(Text(kMaxField));
     disable->add_option("BUS", a->bus, "USB bus ID")->check(Text(kMaxField));
     disable->add_option("--bus", a->bus, "USB bus ID (prefix) of the printers to forget, without DEV")
         ->check(Text(kMaxField));
@@ -141,14 +139,10 @@ void AddUsbCommands(CLI::App &app, Registry &reg) {
         [&reg, a] { return Disable(reg, *a); },
         [a] { return a->dev.empty() && a->bus.empty() ? "give DEV, --bus BUS, or both" : ""; });
 
-    auto dev = std::make_shared<std::string>();
-    CLI::App *devid = usb->add_subcommand("devid", "ask a usblp device for its IEEE 1284 device ID string");
-    devid->add_option("DEV", *dev, devHelp)->required()->check(Text(kMaxField));
-    reg.On(devid, "xavoprinter usb devid lp0", [&reg, dev] { return Devid(reg, *dev); });
-
-    CLI::App *reset = usb->add_subcommand("reset", "soft-reset a usblp device");
-    reset->add_option("DEV", *dev, devHelp)->required()->check(Text(kMaxField));
-    reg.On(reset, "xavoprinter usb reset lp0", [&reg, dev] { return Reset(reg, *dev); });
+    reg.Leaf(usb, "devid", "ask a usblp device for its IEEE 1284 device ID string", Arg::kDevice, a->dev,
+             "xavoprinter usb devid lp0", [&reg, a] { return Devid(reg, a->dev); });
+    reg.Leaf(usb, "reset", "soft-reset a usblp device", Arg::kDevice, a->dev, "xavoprinter usb reset lp0",
+             [&reg, a] { return Reset(reg, a->dev); });
 }
 
 }  // namespace cli

@@ -11,6 +11,12 @@
 
 namespace cli {
 
+// The arguments many subcommands take, each with its name, help and check.
+enum class Arg { kPrinterId, kIp, kDevice, kQueueName };
+// Adds `arg` to `sub` as a required argument read into `value`.
+CLI::Option *AddArg(CLI::App *sub, Arg arg, std::string &value);
+constexpr char kDeviceHelp[] = "usblp device name (lp0, lp1) or device path";
+
 struct Registry {
     bool bJson = false;
     bool bVerbose = false;
@@ -22,6 +28,10 @@ struct Registry {
     // whole ("" when nothing), a usage error found while parsing.
     void On(CLI::App *sub, const std::string &example, std::function<int()> run,
             std::function<std::string()> check = {});
+    // A subcommand of `group` whose one argument is `arg`, made runnable
+    // as by On.
+    void Leaf(CLI::App *group, const std::string &name, const std::string &description, Arg arg,
+              std::string &value, const std::string &example, std::function<int()> run);
 };
 
 void AddPrinterCommands(CLI::App &app, Registry &reg);  // list, show

@@ -12,6 +12,7 @@
 #include <exception>
 #include <string>
 
+#include "checks.h"
 #include "commands.h"
 #include "xavoprinter.h"
 
@@ -31,6 +32,24 @@ void Registry::On(CLI::App *sub, const std::string &example, std::function<int()
         }
         action = run;
     });
+}
+
+void Registry::Leaf(CLI::App *group, const std::string &name, const std::string &description, Arg arg,
+                    std::string &value, const std::string &example, std::function<int()> run) {
+    CLI::App *sub = group->add_subcommand(name, description);
+    AddArg(sub, arg, value);
+    On(sub, example, std::move(run));
+}
+
+CLI::Option *AddArg(CLI::App *sub, Arg arg, std::string &value) {
+    switch (arg) {
+        case Arg::kPrinterId: return sub->add_option("ID", value, "printer ID")->required()->check(Text(kMaxPrinterId));
+        case Arg::kIp: return sub->add_option("IP", value, "the printer's IPv4 address")->required()->check(IPv4());
+        case Arg::kDevice: return sub->add_option("DEV", value, kDeviceHelp)->required()->check(Text(kMaxField));
+        case Arg::kQueueName:
+            return sub->add_option("NAME", value, "CUPS queue name")->required()->check(CupsQueueName());
+    }
+    return nullptr;
 }
 
 std::string CupsNameOf(const std::string &printerId) {
