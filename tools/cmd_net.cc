@@ -98,8 +98,7 @@ int Remove(const Registry &reg, const NetArgs &a) {
     const std::string id = conf.szPrinterId;
     r.Set("printer_id", id);
     r.Set("cups_queue", a.name);
-    const std::vector<std::string> ids = NetPrinterIds();
-    const bool bHadLine = std::find(ids.begin(), ids.end(), id) != ids.end();
+    const bool bHadLine = Contains(NetPrinterIds(), id);
     const std::optional<Queues> queues = AskQueues(reg.bVerbose);
     if (!queues) return r.FailWithoutCode("CUPS could not be asked whether queue " + a.name + " exists (is cupsd running?)");
     const bool bHadQueue = queues->StateOf(a.name) != QueueState::kMissing && CupsNameOf(id) == a.name;
@@ -116,8 +115,7 @@ int Remove(const Registry &reg, const NetArgs &a) {
     if (bHadLine && XAVOPrinterNetUpdateConf(0, &conf) != 0) {
         return r.Fail("could not remove the network printer table line of " + a.ip);
     }
-    const std::vector<std::string> idsAfter = NetPrinterIds();
-    const bool bLineGone = std::find(idsAfter.begin(), idsAfter.end(), id) == idsAfter.end();
+    const bool bLineGone = !Contains(NetPrinterIds(), id);
     r.Set("table_line_removed", bHadLine && bLineGone);
     if (!bLineGone) return r.FailWithoutCode("the network printer table still holds " + id);
     r.Note("the printer's section stays in the printer configuration file");

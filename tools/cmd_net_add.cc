@@ -17,8 +17,6 @@
 namespace cli {
 namespace {
 
-constexpr char kPrinterConf[] = "/usr/xavo/etc/printer.conf";
-
 struct AddArgs {
     std::string ip, name, backend = "socket", queue, brand, model, deviceId, driver, ppd;
     bool bReplace = false;
@@ -58,10 +56,7 @@ Conflicts FindConflicts(const std::string &ip, const std::string &name, const st
 
 bool SectionExists(const std::string &id) {
     OwnedHash hash(ORLICSzHashAlloc(64));
-    ORLICSzHash *h = hash.release();
-    const int32_t n = ORLICFileGetSection(kPrinterConf, id.c_str(), &h);
-    hash.reset(h);
-    return n > 0;
+    return ReadSection(id, hash) > 0;
 }
 
 // Takes another printer away as "net remove" would; its section stays.

@@ -1,5 +1,4 @@
 // list, show: the appliance's printers as its files and CUPS see them.
-#include <algorithm>
 #include <memory>
 #include <vector>
 
@@ -13,8 +12,6 @@
 namespace cli {
 namespace {
 
-constexpr char kPrinterConf[] = "/usr/xavo/etc/printer.conf";
-
 int List(const Registry &reg) {
     Report r(reg.bJson, {"count", "printers"});
     ResetPlatformError();
@@ -27,7 +24,7 @@ int List(const Registry &reg) {
     if (!queues) r.Note("CUPS could not be asked (is cupsd running?): queue states unknown");
     Json rows = Json::array();
     for (const std::string &id : Items(all.get())) {
-        const bool bUsb = std::find(usbIds.begin(), usbIds.end(), id) != usbIds.end();
+        const bool bUsb = Contains(usbIds, id);
         const std::string name = CupsNameOf(id);
         Json state = nullptr;
         if (!name.empty() && queues) state = QueueStateName(queues->StateOf(name));
@@ -51,10 +48,7 @@ int Show(const Registry &reg, const std::string &id) {
     ResetPlatformError();
     OwnedHash hash(ORLICSzHashAlloc(512));
     if (!hash) return r.Fail("no memory for the printer's section");
-    ORLICSzHash *h = hash.release();
-    const int32_t n = ORLICFileGetSection(kPrinterConf, id.c_str(), &h);
-    hash.reset(h);
-    if (n <= 0) return r.FailWithoutCode("no printer " + id + " in " + kPrinterConf);
+    if (ReadSection(id, hash) <= 0) return r.FailWithoutCode("no printer " + id + " in " + kPrinterConf);
     Json keys = Json::array();
     for (const std::string &key : HashKeys(hash.get())) {
         const char *value = ORLICSzHashGetValue(hash.get(), key.c_str());

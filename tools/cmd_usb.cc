@@ -2,7 +2,6 @@
 // handler sees them.
 #include <sys/stat.h>
 
-#include <algorithm>
 #include <memory>
 #include <vector>
 
@@ -24,10 +23,6 @@ struct UsbArgs {
     std::string dev;
     std::string bus;
 };
-
-bool Contains(const std::vector<std::string> &items, const std::string &item) {
-    return std::find(items.begin(), items.end(), item) != items.end();
-}
 
 // Whether the kernel knows a usblp device of this name: the driver's
 // class directory in sysfs has an entry for every device it bound.

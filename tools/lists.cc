@@ -1,5 +1,6 @@
 #include "lists.h"
 
+#include <algorithm>
 #include <cstdlib>
 
 namespace cli {
@@ -16,6 +17,17 @@ std::vector<std::string> HashKeys(const ORLICSzHash *hash) {
     const int32_t r = ORLICSzHashEnumKey(hash, &raw);
     OwnedList keys(raw);
     return r < 0 ? std::vector<std::string>{} : Items(keys.get());
+}
+
+bool Contains(const std::vector<std::string> &items, const std::string &item) {
+    return std::find(items.begin(), items.end(), item) != items.end();
+}
+
+int32_t ReadSection(const std::string &printerId, OwnedHash &hash) {
+    ORLICSzHash *raw = hash.release();
+    const int32_t n = ORLICFileGetSection(kPrinterConf, printerId.c_str(), &raw);
+    hash.reset(raw);
+    return n;
 }
 
 namespace {

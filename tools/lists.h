@@ -21,6 +21,13 @@ using OwnedHash = std::unique_ptr<ORLICSzHash, HashFree>;
 
 std::vector<std::string> Items(const ORLICSzList *list);
 std::vector<std::string> HashKeys(const ORLICSzHash *hash);
+bool Contains(const std::vector<std::string> &items, const std::string &item);
+
+// The printer configuration file: a section per printer ID.
+constexpr char kPrinterConf[] = "/usr/xavo/etc/printer.conf";
+// Reads the printer's section into `hash`, which the platform may grow
+// into a new one: the number of keys, 0 or less when there is none.
+int32_t ReadSection(const std::string &printerId, OwnedHash &hash);
 
 // Printer IDs of the USB printers present ("" list when none or unreadable).
 std::vector<std::string> UsbPrinterIds();
