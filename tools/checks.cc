@@ -3,6 +3,7 @@
 #include <arpa/inet.h>
 
 namespace cli {
+namespace {
 
 std::string CheckIPv4(const std::string &text) {
     // inet_pton takes exactly four dotted decimal numbers up to 255, no
@@ -27,12 +28,7 @@ std::string CheckCupsQueueName(const std::string &text) {
     return "";
 }
 
-std::string CheckNotEmpty(const std::string &text) { return text.empty() ? "must not be empty" : ""; }
-
-std::string CheckMaxLength(const std::string &text, std::size_t max) {
-    if (text.size() > max) return "is longer than " + std::to_string(max) + " characters";
-    return "";
-}
+}  // namespace
 
 CLI::Validator IPv4() {
     return CLI::Validator([](std::string &s) { return CheckIPv4(s); }, "IPv4", "IPv4");
@@ -44,9 +40,10 @@ CLI::Validator CupsQueueName() {
 
 CLI::Validator Text(std::size_t max) {
     return CLI::Validator(
-        [max](std::string &s) {
-            std::string why = CheckNotEmpty(s);
-            return why.empty() ? CheckMaxLength(s, max) : why;
+        [max](std::string &s) -> std::string {
+            if (s.empty()) return "must not be empty";
+            if (s.size() > max) return "is longer than " + std::to_string(max) + " characters";
+            return "";
         },
         "", "Text");
 }

@@ -10,13 +10,8 @@
 
 namespace cli {
 
-// Each returns "" when the text is acceptable, else what is wrong with it.
-std::string CheckIPv4(const std::string &text);
-std::string CheckCupsQueueName(const std::string &text);
-std::string CheckNotEmpty(const std::string &text);
-std::string CheckMaxLength(const std::string &text, std::size_t max);
-
-// The same as CLI11 validators.
+// Validators: each says what is wrong with a value, nothing when it is
+// acceptable.
 CLI::Validator IPv4();
 CLI::Validator CupsQueueName();
 // Not empty and at most `max` bytes: what a fixed-size field of the
