@@ -99,16 +99,15 @@ int Remove(const Registry &reg, const NetArgs &a) {
     r.Set("printer_id", id);
     r.Set("cups_queue", a.name);
     const bool bHadLine = Contains(NetPrinterIds(), id);
-    const std::optional<Queues> queues = AskQueues(reg.bVerbose);
-    if (!queues) return r.FailWithoutCode("CUPS could not be asked whether queue " + a.name + " exists (is cupsd running?)");
-    const bool bHadQueue = queues->StateOf(a.name) != QueueState::kMissing && CupsNameOf(id) == a.name;
+    const std::optional<QueueState> state = AskQueueState(a.name, reg.bVerbose);
+    if (!state) return r.FailWithoutCode("CUPS could not be asked whether queue " + a.name + " exists (is cupsd running?)");
+    const bool bHadQueue = *state != QueueState::kMissing && CupsNameOf(id) == a.name;
     if (!bHadLine && !bHadQueue) {
         return r.FailWithoutCode("no network printer " + id + ": no line for it in the network printer table and no CUPS queue");
     }
     ResetPlatformError();
     if (bHadQueue && XAVOPrinterNetCupsRm(id.c_str()) != 0) return r.Fail("could not remove the CUPS queue " + a.name);
-    const std::optional<Queues> after = AskQueues(reg.bVerbose);
-    const bool bQueueGone = after && after->StateOf(a.name) == QueueState::kMissing;
+    const bool bQueueGone = AskQueueState(a.name, reg.bVerbose) == QueueState::kMissing;
     r.Set("queue_removed", bHadQueue && bQueueGone);
     if (bHadQueue && !bQueueGone) return r.FailWithoutCode("the CUPS queue " + a.name + " is still there");
     ResetPlatformError();

@@ -26,9 +26,8 @@ struct QueueArgs {
 
 // The state CUPS reports for a queue, null when CUPS cannot be asked.
 Json StateOf(const Registry &reg, const std::string &name) {
-    const std::optional<Queues> queues = AskQueues(reg.bVerbose);
-    if (!queues) return nullptr;
-    return QueueStateName(queues->StateOf(name));
+    const std::optional<QueueState> state = AskQueueState(name, reg.bVerbose);
+    return state ? Json(QueueStateName(*state)) : Json(nullptr);
 }
 
 int Add(const Registry &reg, const QueueArgs &a) {

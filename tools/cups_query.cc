@@ -185,6 +185,12 @@ std::optional<Queues> AskQueues(bool bVerbose) {
     return queues;
 }
 
+std::optional<QueueState> AskQueueState(const std::string &name, bool bVerbose) {
+    const std::optional<Queues> queues = AskQueues(bVerbose);
+    if (!queues) return std::nullopt;
+    return queues->StateOf(name);
+}
+
 std::optional<std::vector<JobLine>> AskJobs(const std::string &queue, bool bVerbose) {
     std::optional<std::string> out =
         Run(queue.empty() ? std::vector<std::string>{kLpq, "-a"} : std::vector<std::string>{kLpq, "-P", queue},

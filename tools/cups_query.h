@@ -41,6 +41,8 @@ struct Queues {
     QueueState StateOf(const std::string &name) const;
 };
 std::optional<Queues> AskQueues(bool bVerbose);
+// The state of one queue; nullopt when the scheduler cannot be asked.
+std::optional<QueueState> AskQueueState(const std::string &name, bool bVerbose);
 
 // The jobs lpq lists for a queue, or for every queue when name is empty
 // ("lpq -a"); nullopt when lpq could not be run.
