@@ -12,6 +12,8 @@
 #include <cstdio>
 #include <regex>
 
+#include <nlohmann/json.hpp>
+
 #include "sandbox/sandbox.h"
 
 namespace xavo::demo {
@@ -119,19 +121,12 @@ void ShowLibraryLog() {
     }
 }
 
-// The value of a "key": "value" pair in the one-line JSON object that
-// xavoprinter --json prints; "" when absent.
+// The text under key in the one-line JSON object that xavoprinter --json
+// prints; "" when absent or not text.
 std::string JsonText(const std::string &json, const std::string &key) {
-    const std::string head = "\"" + key + "\":\"";
-    size_t at = json.find(head);
-    if (at == std::string::npos) return "";
-    at += head.size();
-    std::string value;
-    for (; at < json.size() && json[at] != '"'; ++at) {
-        if (json[at] == '\\' && at + 1 < json.size()) ++at;
-        value += json[at];
-    }
-    return value;
+    const nlohmann::json object = nlohmann::json::parse(json, nullptr, false);
+    const auto at = object.is_object() ? object.find(key) : object.end();
+    return at != object.end() && at->is_string() ? at->get<std::string>() : "";
 }
 
 std::string Quoted(const std::string &word) {
