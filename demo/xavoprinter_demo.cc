@@ -40,8 +40,6 @@
 #include "sandbox/snmpd.h"
 #include "sandbox/socket_listener.h"
 
-extern char **environ;
-
 namespace {
 
 using namespace xavo::demo;
@@ -101,8 +99,8 @@ void NetworkChapters(Walk &walk, Stage &stage) {
     walk.Check(got == letter, "the bytes that arrived are the file's");
 }
 
-void OpenShell(const std::vector<std::string> &env) {
-    Say("\n" + Paint("1", "== A shell in the sandbox"));
+void OpenShell(Walk &walk) {
+    walk.Chapter("A shell in the sandbox");
     Say("The printers are still there: try 'xavoprinter --help', 'xavoprinter list', 'lpstat -t',");
     Say("'cat /usr/xavo/etc/printer.conf', 'testparm -s /etc/samba/smb.reserved.conf', 'avahi-browse -arpt',");
     Say(std::string("'xavoprinter net probe ") + kMdnsIp + "'.");
@@ -110,7 +108,7 @@ void OpenShell(const std::vector<std::string> &env) {
     pid_t pid = -1;
     const std::vector<std::string> args = {"/bin/bash", "--norc"};
     std::vector<char *> argv = Pointers(args);
-    std::vector<char *> envp = Pointers(env);
+    std::vector<char *> envp = Pointers(walk.env());
     if (posix_spawn(&pid, argv[0], nullptr, nullptr, argv.data(), envp.data()) == 0) WaitExit(pid);
     // Ctrl-C typed in the shell reached the demo too: it was meant for
     // the shell's commands.
@@ -154,7 +152,6 @@ std::vector<std::string> WalkEnvironment(const std::string &cliDir, const std::s
 }
 
 int RunDemo(bool bShell, const std::string &cliDir, const std::string &preload) {
-    const std::vector<std::string> env = WalkEnvironment(cliDir, preload);
     Say(Paint("1", "xavoprinter demo: a network storage appliance's printers, in a sandbox"));
     Say("Private mount and network namespaces: /usr /etc /var are overlays whose writes vanish, /tmp /run /dev");
     Say("are fresh, the network is loopback only. Nothing here touches the host.");
@@ -167,12 +164,12 @@ int RunDemo(bool bShell, const std::string &cliDir, const std::string &preload) 
     }
     xavo::test::TakeLogs();
 
-    Walk walk(env);
+    Walk walk(WalkEnvironment(cliDir, preload));
     UsbChapters(walk);
     NetworkChapters(walk, stage);
     MdnsChapters(walk, stage);
     NobodyChapter(walk);
-    if (bShell) OpenShell(env);
+    if (bShell) OpenShell(walk);
     CleanUpChapter(walk);
 
     Say("\n" + Paint(walk.failures() == 0 ? "32;1" : "31;1",
