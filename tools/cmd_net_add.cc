@@ -3,7 +3,6 @@
 // none of them; the command checks first, and takes back what it made
 // when a later call fails.  Only the section cannot be taken back: the
 // library never removes one.
-#include <cstdio>
 #include <memory>
 #include <vector>
 
@@ -71,15 +70,12 @@ bool TakeAway(const std::string &otherId) {
 
 NetPrinterConf ConfFrom(const AddArgs &a) {
     NetPrinterConf conf = NetConf(a.ip, a.name);
-    const auto put = [](char *field, size_t cb, const std::string &value) {
-        std::snprintf(field, cb, "%s", value.c_str());
-    };
-    put(conf.szBackend, sizeof conf.szBackend, a.backend);
-    put(conf.szQName, sizeof conf.szQName, a.queue);
-    put(conf.szBrand, sizeof conf.szBrand, a.brand);
-    put(conf.szModel, sizeof conf.szModel, a.model);
-    put(conf.szStringId, sizeof conf.szStringId, a.deviceId);
-    put(conf.szDriver, sizeof conf.szDriver, a.driver);
+    PutField(conf.szBackend, a.backend);
+    PutField(conf.szQName, a.queue);
+    PutField(conf.szBrand, a.brand);
+    PutField(conf.szModel, a.model);
+    PutField(conf.szStringId, a.deviceId);
+    PutField(conf.szDriver, a.driver);
     return conf;
 }
 

@@ -1,17 +1,14 @@
 #include "net_conf.h"
 
-#include <cstring>
-
 #include "checks.h"
 
 namespace cli {
 
 NetPrinterConf NetConf(const std::string &ip, const std::string &name) {
     NetPrinterConf conf{};
-    const std::string id = ip + "-" + name;
-    std::memcpy(conf.szIP, ip.c_str(), std::min(ip.size(), sizeof conf.szIP - 1));
-    std::memcpy(conf.szCupsPrinterName, name.c_str(), std::min(name.size(), sizeof conf.szCupsPrinterName - 1));
-    std::memcpy(conf.szPrinterId, id.c_str(), std::min(id.size(), sizeof conf.szPrinterId - 1));
+    PutField(conf.szIP, ip);
+    PutField(conf.szCupsPrinterName, name);
+    PutField(conf.szPrinterId, ip + "-" + name);
     return conf;
 }
 
