@@ -30,42 +30,52 @@ namespace {
 
 constexpr char kPrinterConf[] = "/usr/xavo/etc/printer.conf";
 
+// Secrets among them: never taken from the command line, where any user
+// can read them in the process list.
 TEST(Cli, UsageErrorsExitTwoBeforeAnythingRuns) {
-    const std::vector<std::vector<std::string>> cases = {
-        {},
-        {"frobnicate"},
-        {"usb"},                                        // a group without its subcommand
-        {"usb", "enable", "lp0"},                       // missing BUS
-        {"usb", "disable"},                             // neither DEV nor --bus
-        {"print", "id", "/etc/hostname", "--bogus"},    // unknown option
-        {"print", "id"},                                // missing FILE
-        {"print", "id", "/no/such/file"},
-        {"job", "wait", "id", "j", "--timeout", "abc"},
-        {"job", "wait", "id", "j", "--timeout", "30s"},
-        {"job", "wait", "id", "j", "--timeout", "-5"},
-        {"job", "wait", "id", "j", "--timeout", "0"},
-        {"net", "add", "999.1.1.1", "office"},
-        {"net", "add", "not-an-ip", "office"},
-        {"net", "add", "127.0.0.7", "my printer"},
-        {"net", "add", "127.0.0.7", "a/b"},
-        {"net", "add", "127.0.0.7", std::string(128, 'q')},
-        {"net", "add", "127.0.0.7", "office", "--backend", "carrier-pigeon"},
-        {"net", "ping", "127.1"},
-        {"usbip", "eject", ""},
-        {"show", std::string(128, 'x')},
-        {"cloud", "set", ""},
-        {"cloud", "set", std::string(255, 'a')},
+    const struct {
+        std::vector<std::string> args;
+        std::string says = "";
+    } cases[] = {
+        {{}},
+        {{"frobnicate"}},
+        {{"usb"}},                                      // a group without its subcommand
+        {{"usb", "enable", "lp0"}},                     // missing BUS
+        {{"usb", "disable"}},                           // neither DEV nor --bus
+        {{"print", "id", "/etc/hostname", "--bogus"}},  // unknown option
+        {{"print", "id"}},                              // missing FILE
+        {{"print", "id", "/no/such/file"}},
+        {{"job", "wait", "id", "j", "--timeout", "abc"}},
+        {{"job", "wait", "id", "j", "--timeout", "30s"}},
+        {{"job", "wait", "id", "j", "--timeout", "-5"}},
+        {{"job", "wait", "id", "j", "--timeout", "0"}},
+        {{"net", "add", "999.1.1.1", "office"}},
+        {{"net", "add", "not-an-ip", "office"}},
+        {{"net", "add", "127.0.0.7", "my printer"}},
+        {{"net", "add", "127.0.0.7", "a/b"}},
+        {{"net", "add", "127.0.0.7", std::string(128, 'q')}},
+        {{"net", "add", "127.0.0.7", "office", "--backend", "carrier-pigeon"}},
+        {{"net", "ping", "127.1"}},
+        {{"usbip", "eject", ""}},
+        {{"show", std::string(128, 'x')}},
+        {{"cloud", "set", ""}},
+        {{"cloud", "set", std::string(255, 'a')}},
+        {{"cloud", "set", "user@example.com", "--password", "hunter2"}, "standard input"},
+        {{"cloud", "set", "user@example.com", "--password=hunter2", "hunter2"}, "standard input"},
+        {{"cloud", "set", "user@example.com", "--refresh-token", "hunter2"}, "standard input"},
+        {{"cloud", "set", "user@example.com", "--secret=x", "hunter2"}, "standard input"},
     };
-    for (const auto &args : cases) {
-        CliRun r = Cli(args);
-        EXPECT_EQ(r.status, 2) << ::testing::PrintToString(args) << "\n" << r.out << r.err;
-        EXPECT_EQ(r.out, "") << ::testing::PrintToString(args);
+    for (const auto &c : cases) {
+        CliRun r = Cli(c.args);
+        EXPECT_EQ(r.status, 2) << ::testing::PrintToString(c.args) << "\n" << r.out << r.err;
+        EXPECT_EQ(r.out, "") << ::testing::PrintToString(c.args);
+        EXPECT_THAT(r.err, HasSubstr(c.says)) << ::testing::PrintToString(c.args);
     }
     EXPECT_FALSE(FileExists(kPrinterConf));
     EXPECT_FALSE(FileExists("/usr/xavo/etc/nptab"));
 }
 
-TEST(Cli, GroupsListTheirSubcommandsAndEveryLeafHasAnExample) {
+TEST(Cli, GroupsListTheirSubcommandsEveryLeafHasAnExampleAndVersionAnswers) {
     const struct {
         std::string group;
         std::vector<std::string> subcommands;
@@ -82,6 +92,9 @@ TEST(Cli, GroupsListTheirSubcommandsAndEveryLeafHasAnExample) {
     };
     const CliRun top = Cli({"--help"});
     EXPECT_EQ(top.status, 0);
+    const CliRun version = Cli({"--version"});
+    EXPECT_EQ(version.status, 0);
+    EXPECT_EQ(version.out, std::string("xavoprinter ") + XAVO_VERSION + "\n");
     for (const auto &g : groups) {
         EXPECT_THAT(top.out, HasSubstr("  " + g.group + " ")) << g.group;
         const CliRun help = Cli({g.group, "--help"});
@@ -123,12 +136,7 @@ TEST(Cli, BashCompletionOffersSubcommandsOptionsAndDevices) {
     for (const auto &c : cases) EXPECT_EQ(Completions(c.words), c.offered) << c.words;
 }
 
-TEST(Cli, VersionIsTheProjectVersion) {
-    const CliRun r = Cli({"--version"});
-    EXPECT_EQ(r.status, 0);
-    EXPECT_EQ(r.out, std::string("xavoprinter ") + XAVO_VERSION + "\n");
-}
-
+// The whole of standard error: without -v no syslog line of the library.
 TEST(Cli, FailuresAreSentencesWithTheCodeOnlyWhereThereIsOne) {
     const struct {
         std::vector<std::string> args;
@@ -147,40 +155,29 @@ TEST(Cli, FailuresAreSentencesWithTheCodeOnlyWhereThereIsOne) {
         EXPECT_EQ(r.err, c.says) << ::testing::PrintToString(c.args);
     }
     EXPECT_FALSE(FileExists("/tmp/usbtab") && ReadFile("/tmp/usbtab").find("lp7") != std::string::npos);
-}
-
-TEST(Cli, VerboseCopiesTheLibrarysSyslogLinesToStandardError) {
-    EXPECT_THAT(Cli({"usb", "devid", "lp1"}).err, Not(HasSubstr("printer_get_string_id:")));
     EXPECT_THAT(Cli({"usb", "devid", "lp1", "-v"}).err, HasSubstr("printer_get_string_id:"));
-}
-
-TEST(Cli, SecretsNeverComeFromTheCommandLine) {
-    for (const char *bad : {"--password", "--password=hunter2", "--refresh-token", "--secret=x"}) {
-        const CliRun r = Cli({"cloud", "set", "user@example.com", bad, "hunter2"});
-        EXPECT_EQ(r.status, 2) << bad;
-        EXPECT_THAT(r.err, HasSubstr("standard input")) << bad;
-    }
-    EXPECT_FALSE(FileExists(kPrinterConf));
 }
 
 TEST(Cli, SecretsThatWouldBeStoredEmptyOrCutAreRefusedBeforeAnythingIsWritten) {
     const struct {
-        std::vector<std::string> args;
+        bool bToken;
         std::string input;
         bool bStored;
     } cases[] = {
-        {{"cloud", "set", "u@example.com"}, "", false},
-        {{"cloud", "set", "u@example.com"}, "\n", false},
-        {{"cloud", "set", "u@example.com"}, std::string(200, 'p') + "\n", false},
-        {{"cloud", "set", "u@example.com"}, std::string(128, 'p') + "\n", false},
-        {{"cloud", "set", "u@example.com"}, std::string("pa\0ss\n", 6), false},
-        {{"cloud", "set", "u@example.com", "--token"}, std::string(256, 't') + "\n", false},
-        {{"cloud", "set", "u@example.com"}, std::string(127, 'p') + "\n", true},
-        {{"cloud", "set", "u@example.com", "--token"}, std::string(255, 't') + "\r\n", true},
+        {false, "", false},
+        {false, "\n", false},
+        {false, std::string(200, 'p') + "\n", false},
+        {false, std::string(128, 'p') + "\n", false},
+        {false, std::string("pa\0ss\n", 6), false},
+        {true, std::string(256, 't') + "\n", false},
+        {false, std::string(127, 'p') + "\n", true},
+        {true, std::string(255, 't') + "\r\n", true},
     };
     for (const auto &c : cases) {
         ResetSandbox();
-        const CliRun set = Cli(c.args, c.input);
+        std::vector<std::string> args = {"cloud", "set", "u@example.com"};
+        if (c.bToken) args.push_back("--token");
+        const CliRun set = Cli(args, c.input);
         EXPECT_EQ(set.status, c.bStored ? 0 : 1) << c.input.size() << set.err;
         const CliRun get = Cli({"cloud", "get", "--reveal", "--json"});
         if (!c.bStored) {
@@ -195,60 +192,50 @@ TEST(Cli, SecretsThatWouldBeStoredEmptyOrCutAreRefusedBeforeAnythingIsWritten) {
     }
 }
 
-// The command waiting at its password prompt on a pseudo-terminal.
-struct Prompt {
-    pid_t pid = -1;
-    int master = -1;
-};
-
-Prompt StartAtPrompt() {
-    Prompt p;
-    p.pid = forkpty(&p.master, nullptr, nullptr, nullptr);
-    if (p.pid == 0) {
-        execl(XAVO_CLI_PATH, XAVO_CLI_PATH, "cloud", "set", "u@example.com", static_cast<char *>(nullptr));
-        _exit(127);
-    }
-    return p;
-}
-
 bool EchoOn(int fd) {
     termios t{};
     return tcgetattr(fd, &t) == 0 && (t.c_lflag & ECHO) != 0;
 }
 
+// The command at its password prompt on a pseudo-terminal, stopped by a
+// signal or, for 0, given the secret: the echo is back on either way, and
+// a typed secret is stored without having been echoed.
 TEST(Cli, PromptGivesTheTerminalBackOnCtrlCAndSigterm) {
-    for (int sig : {SIGINT, SIGTERM, SIGHUP}) {
-        Prompt p = StartAtPrompt();
-        ASSERT_GT(p.pid, 0);
-        ASSERT_TRUE(EchoOn(p.master));
+    for (int sig : {SIGINT, SIGTERM, SIGHUP, 0}) {
+        int master = -1;
+        const pid_t pid = forkpty(&master, nullptr, nullptr, nullptr);
+        if (pid == 0) {
+            execl(XAVO_CLI_PATH, XAVO_CLI_PATH, "cloud", "set", "u@example.com", static_cast<char *>(nullptr));
+            _exit(127);
+        }
+        ASSERT_GT(pid, 0);
+        ASSERT_TRUE(EchoOn(master));
         // Bounded wait until the prompt has turned the echo off.
-        for (int i = 0; i < 500 && EchoOn(p.master); ++i) std::this_thread::sleep_for(std::chrono::milliseconds(10));
-        ASSERT_FALSE(EchoOn(p.master)) << "the prompt never turned the echo off";
-        kill(p.pid, sig);
+        for (int i = 0; i < 500 && EchoOn(master); ++i) std::this_thread::sleep_for(std::chrono::milliseconds(10));
+        ASSERT_FALSE(EchoOn(master)) << "the prompt never turned the echo off";
+        if (sig != 0) {
+            kill(pid, sig);
+        } else {
+            ASSERT_EQ(write(master, "typed-secret\n", 13), 13);
+        }
+        std::string shown;
+        char buf[256];
+        pollfd pfd{master, POLLIN, 0};
+        for (ssize_t n; poll(&pfd, 1, 10000) == 1 && (n = read(master, buf, sizeof buf)) > 0;) {
+            shown.append(buf, static_cast<size_t>(n));
+        }
         int status = 0;
-        ASSERT_EQ(waitpid(p.pid, &status, 0), p.pid);
-        EXPECT_TRUE(WIFSIGNALED(status) && WTERMSIG(status) == sig) << sig;
-        EXPECT_TRUE(EchoOn(p.master)) << "echo left off after signal " << sig;
-        close(p.master);
+        ASSERT_EQ(waitpid(pid, &status, 0), pid);
+        if (sig != 0) {
+            EXPECT_TRUE(WIFSIGNALED(status) && WTERMSIG(status) == sig) << sig;
+        } else {
+            EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << shown;
+        }
+        EXPECT_TRUE(EchoOn(master)) << "echo left off after signal " << sig;
+        EXPECT_THAT(shown, AllOf(HasSubstr("password: "), Not(HasSubstr("typed-secret"))));
+        close(master);
+        EXPECT_EQ(FileExists(kPrinterConf), sig == 0) << sig;
     }
-    EXPECT_FALSE(FileExists(kPrinterConf));
-
-    // Typed and entered: stored, echo back on, nothing of it echoed.
-    Prompt p = StartAtPrompt();
-    ASSERT_GT(p.pid, 0);
-    for (int i = 0; i < 500 && EchoOn(p.master); ++i) std::this_thread::sleep_for(std::chrono::milliseconds(10));
-    ASSERT_EQ(write(p.master, "typed-secret\n", 13), 13);
-    std::string shown;
-    char buf[256];
-    pollfd pfd{p.master, POLLIN, 0};
-    for (ssize_t n; poll(&pfd, 1, 10000) == 1 && (n = read(p.master, buf, sizeof buf)) > 0;) {
-        shown.append(buf, static_cast<size_t>(n));
-    }
-    int status = 0;
-    ASSERT_EQ(waitpid(p.pid, &status, 0), p.pid);
-    EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << shown;
-    EXPECT_THAT(shown, AllOf(HasSubstr("password: "), Not(HasSubstr("typed-secret"))));
-    close(p.master);
     EXPECT_EQ(nlohmann::json::parse(Cli({"cloud", "get", "--reveal", "--json"}).out)["secret"], "typed-secret");
 }
 
