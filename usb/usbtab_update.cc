@@ -3,10 +3,10 @@
 #include <syslog.h>
 
 #include <cstring>
-#include <string_view>
 
 #include "internal/guards.h"
 #include "internal/log.h"
+#include "internal/text.h"
 #include "usb/usb_enable.h"
 #include "usb/usb_paths.h"
 #include "xavocore.h"
@@ -21,15 +21,6 @@ constexpr char kLogRmUsbtabFailed[] = "%s:%d rm usbtab failed, key=%s";
 
 constexpr int32_t kHashCapacity = 1024;
 constexpr int32_t kListCapacity = 1024;
-
-// A text can be a key or a value of the table only if it cannot end or
-// break its line: "=" and '"' split a line, a line break starts another.
-bool FitsTableLine(std::string_view text) {
-    for (unsigned char c : text) {
-        if (c == '=' || c == '"' || c < 0x20 || c == 0x7f) return false;
-    }
-    return true;
-}
 
 int32_t RemoveByBusId(const char *szBusId) {
     xavo::SzHash hash(ORLICSzHashAlloc(kHashCapacity));
