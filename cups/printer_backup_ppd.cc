@@ -1,7 +1,5 @@
 #include <syslog.h>
 
-#include <cstring>
-
 #include "cups/queue_create.h"
 #include "internal/log.h"
 #include "internal/name_path.h"
@@ -22,7 +20,7 @@ constexpr char kCondDestFits[] =
 namespace xavo {
 
 bool KeptPpdName(const char *szPrinterId) {
-    return std::strchr(szPrinterId, '/') == nullptr && !HoldsFilePattern(szPrinterId);
+    return IsBaseName(szPrinterId) && !HoldsFilePattern(szPrinterId);
 }
 
 int32_t PrinterBackupPpd(const char *szPpdFile, const char *szPrinterId) {

@@ -29,11 +29,6 @@ XAVO_EXPORT int32_t XAVOPrinterCupsNameCheck(const char *szPrinterId, const char
         // when the line (its device URI) also carries the printer ID.
         return xavo::CheckQueueList(
             0,
-            [&](const FILE *pPipe) {
-                return XARG_OK(pPipe != nullptr, "((void *)0) != pPipe") &&
-                       XARG_OK(szPrinterId != nullptr, "((void *)0) != szPrinterId") &&
-                       XARG_OK(szCupsPrinterName != nullptr, "NULL != szCupsPrinterName");
-            },
             [&](const char *szLine) {
                 if (std::strstr(szLine, szCupsPrinterName) == nullptr) return -1;
                 return std::strstr(szLine, szPrinterId) != nullptr ? 1 : 2;

@@ -43,7 +43,7 @@ bool ChooseName(const char *szPrinterId, char (&szName)[kNameSize]) {
         // seen.
         bool bFirstUsed = false;
         bool bSecondUsed = false;
-        xavo::ReadQueueList([](const FILE *) { return true; },
+        xavo::ReadQueueList([] {},
                             [&](const char *szLine) {
                                 if (!bFirstUsed && std::strstr(szLine, xavo::kFirstUsbQueue) != nullptr) {
                                     bFirstUsed = true;

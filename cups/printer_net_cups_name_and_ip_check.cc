@@ -29,21 +29,14 @@ XAVO_EXPORT int32_t XAVOPrinterNetCupsNameAndIPCheck(const char *szIP, const cha
         int32_t iCount = xavo::CountAllPrinters(kLogEnumFailed, kUnit, __LINE__);
         if (iCount <= 0) return iCount;
         const xavo::AddressPattern pattern(szIP);
-        // The line reader's own argument, checked as it checks its others.
-        const char *szIpPattern = pattern.sz;
         // The first queue whose whole name is the one asked for decides: 1
         // when its device URI carries the address, 2 when it serves another
         // device.
         return xavo::CheckQueueList(
             0,
-            [&](const FILE *pPipe) {
-                return XARG_OK(pPipe != nullptr, "((void *)0) != pPipe") &&
-                       XARG_OK(szCupsPrinterName != nullptr, "((void *)0) != szCupsPrinterName") &&
-                       XARG_OK(szIpPattern != nullptr, "NULL != szIpPattern");
-            },
             [&](const char *szLine) {
                 if (xavo::QueueNameOfLine(szLine) != std::string_view(szCupsPrinterName)) return -1;
-                return std::strstr(szLine, szIpPattern) != nullptr ? 1 : 2;
+                return std::strstr(szLine, pattern.sz) != nullptr ? 1 : 2;
             },
             kUnit, __LINE__);
     });

@@ -24,15 +24,8 @@ XAVO_EXPORT int32_t XAVOPrinterNetIPCheck(const char *szIP) noexcept {
         int32_t iCount = xavo::CountAllPrinters(kLogEnumFailed, kUnit, __LINE__);
         if (iCount <= 0) return iCount < 0 ? -1 : 1;
         const xavo::AddressPattern pattern(szIP);
-        // The line reader's own argument, checked as it checks its others.
-        const char *szIpPattern = pattern.sz;
         return xavo::CheckQueueList(
-            1,
-            [&](const FILE *pPipe) {
-                return XARG_OK(pPipe != nullptr, "((void *)0) != pPipe") &&
-                       XARG_OK(szIpPattern != nullptr, "NULL != szIpPattern");
-            },
-            [&](const char *szLine) { return std::strstr(szLine, szIpPattern) != nullptr ? 0 : -1; }, kUnit,
+            1, [&](const char *szLine) { return std::strstr(szLine, pattern.sz) != nullptr ? 0 : -1; }, kUnit,
             __LINE__);
     });
 }

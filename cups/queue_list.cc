@@ -21,14 +21,15 @@ constexpr char kIpPatternFormat[] = "/%s/";
 constexpr int32_t kAllPrinters = XAVO_PRINTER_TYPE_USB | XAVO_PRINTER_TYPE_NET;
 }  // namespace
 
-bool ReadQueueList(const std::function<bool(const FILE *)> &begin, const std::function<bool(const char *)> &line) {
+bool ReadQueueList(const std::function<void()> &begin, const std::function<bool(const char *)> &line) {
     ErrnoKeeper keep;
     for (int iAttempt = 0; iAttempt < kAttempts; ++iAttempt) {
         Pipe pipe(ORLICPopen(kLpstatPath, "r", "-v", static_cast<const char *>(nullptr)));
         // A tool that does not start costs no pause: nothing of CUPS's
         // state was seen that a pause could let settle.
         if (!pipe) continue;
-        bool bFailed = !begin(pipe.get());
+        begin();
+        bool bFailed = false;
         char szLine[kLineSize] = {};
         while (!bFailed) {
             ReadStatus status = ReadLine(pipe.get(), szLine, sizeof szLine);
@@ -47,14 +48,10 @@ bool ReadQueueList(const std::function<bool(const FILE *)> &begin, const std::fu
     return false;
 }
 
-int32_t CheckQueueList(int32_t iNone, const std::function<bool(const FILE *)> &argsOk,
-                       const std::function<int32_t(const char *)> &decide, const char *szUnit, int iLine) {
+int32_t CheckQueueList(int32_t iNone, const std::function<int32_t(const char *)> &decide, const char *szUnit,
+                       int iLine) {
     int32_t iAnswer = iNone;
-    bool bRead = ReadQueueList(
-        [&](const FILE *pPipe) {
-            iAnswer = iNone;
-            return argsOk(pPipe);
-        },
+    bool bRead = ReadQueueList([&] { iAnswer = iNone; },
         [&](const char *szLine) {
             int32_t iDecided = decide(szLine);
             if (iDecided >= 0) iAnswer = iDecided;

@@ -3,7 +3,6 @@
 #pragma once
 
 #include <cstdint>
-#include <cstdio>
 #include <functional>
 #include <string_view>
 
@@ -12,28 +11,24 @@ namespace xavo {
 inline constexpr char kLpstatPath[] = "/usr/bin/lpstat";
 
 // Runs "lpstat -v" up to 3 times, each caller bringing its own match rule:
-// begin(pPipe) runs at the start of every attempt that got a stream (an
-// attempt may restart the caller's answer, or keep what earlier attempts
-// found); returning false fails the attempt.  line(szLine) sees each trimmed
-// line, or piece of a long line; returning true ends the reading as a
-// success.  An attempt fails when the tool cannot be started (next attempt
-// at once), when a read is interrupted (EINTR), when begin() refuses, or
-// when closing reports a failure; failed attempts that got a stream are
-// followed by a 1-second pause, the last one too.  True after the first
-// attempt that succeeded, false after three failed ones.  The caller's errno
-// is kept.
-bool ReadQueueList(const std::function<bool(const FILE *pPipe)> &begin,
-                   const std::function<bool(const char *szLine)> &line);
+// begin() runs at the start of every attempt that got a stream (an attempt
+// may restart the caller's answer, or keep what earlier attempts found).
+// line(szLine) sees each trimmed line, or piece of a long line; returning
+// true ends the reading as a success.  An attempt fails when the tool
+// cannot be started (next attempt at once), when a read is interrupted
+// (EINTR), or when closing reports a failure; failed attempts that got a
+// stream are followed by a 1-second pause, the last one too.  True after
+// the first attempt that succeeded, false after three failed ones.  The
+// caller's errno is kept.
+bool ReadQueueList(const std::function<void()> &begin, const std::function<bool(const char *szLine)> &line);
 
 // How the check operations (of a name, of an address) read the list: the
 // first line that decide(szLine) answers (0 or more; -1 for a line that
 // does not concern the check) ends the reading with that answer, and a list
-// without one answers iNone.  argsOk(pPipe) is the line reader's own
-// argument check, logged under the caller's unit, and fails the attempt
-// when it refuses.  After three failed attempts ERR_EXEC is set under the
-// caller's unit and line, and the answer is -1.
-int32_t CheckQueueList(int32_t iNone, const std::function<bool(const FILE *pPipe)> &argsOk,
-                       const std::function<int32_t(const char *szLine)> &decide, const char *szUnit, int iLine);
+// without one answers iNone.  After three failed attempts ERR_EXEC is set
+// under the caller's unit and line, and the answer is -1.
+int32_t CheckQueueList(int32_t iNone, const std::function<int32_t(const char *szLine)> &decide, const char *szUnit,
+                       int iLine);
 
 // The pattern the address checks look for: "/ADDR/".  Network queues carry
 // the address between slashes ("socket://ADDR/queue"), so the pattern never

@@ -8,12 +8,14 @@
 // what it holds.  Inputs are laid out as each target reads them (see the
 // comment at the top of fuzz/<target>_fuzz.cc).  Seeds named "edge-*" are
 // written by hand: cases a fuzz run once stopped at, kept as they were.
+#include <cstddef>
 #include <cstdio>
-#include <cstring>
 #include <filesystem>
 #include <fstream>
+#include <initializer_list>
 #include <stdexcept>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "sandbox/avahi.h"
@@ -168,24 +170,31 @@ std::string Str(const std::string &text) {
     return out + "\\;";
 }
 
+// A record's text field and what it is filled with: both records are
+// filled by one helper, each field once.
+struct FieldText {
+    char *sz;
+    size_t cb;
+    std::string text;
+};
+template <size_t N>
+FieldText Field(char (&field)[N], std::string text) {
+    return {field, N, std::move(text)};
+}
+void Fill(std::initializer_list<FieldText> fields) {
+    for (const FieldText &f : fields) std::snprintf(f.sz, f.cb, "%s", f.text.c_str());
+}
+
 void RecordFiles() {
     UsbPrinterConf usb{};
-    std::strcpy(usb.szPrinterId, "04b8:0005:X2Y7Z");
-    std::strcpy(usb.szProducer, "EPSON");
-    std::strcpy(usb.szProductName, "ET-2750 Series");
-    std::strcpy(usb.szMode, "lpr");
-    std::strcpy(usb.szUsblpStringId, kDeviceIds[2].second.c_str());
-    std::strcpy(usb.szEnableAirprint, "1");
+    Fill({Field(usb.szPrinterId, "04b8:0005:X2Y7Z"), Field(usb.szProducer, "EPSON"),
+          Field(usb.szProductName, "ET-2750 Series"), Field(usb.szMode, "lpr"),
+          Field(usb.szUsblpStringId, kDeviceIds[2].second), Field(usb.szEnableAirprint, "1")});
     XAVOPrinterConfSetup(&usb, 0);
     NetPrinterConf net{};
-    std::strcpy(net.szIP, "10.0.0.5");
-    std::strcpy(net.szCupsPrinterName, "office");
-    std::strcpy(net.szBackend, "socket");
-    std::strcpy(net.szQName, "office");
-    std::strcpy(net.szBrand, "ACME");
-    std::strcpy(net.szModel, "LX 100");
-    std::strcpy(net.szStringId, kDeviceIds[0].second.c_str());
-    std::strcpy(net.szPrinterId, "10.0.0.5-office");
+    Fill({Field(net.szIP, "10.0.0.5"), Field(net.szCupsPrinterName, "office"), Field(net.szBackend, "socket"),
+          Field(net.szQName, "office"), Field(net.szBrand, "ACME"), Field(net.szModel, "LX 100"),
+          Field(net.szStringId, kDeviceIds[0].second), Field(net.szPrinterId, "10.0.0.5-office")});
     XAVOPrinterNetConfSetup(&net, 0);
     XAVOPrinterNetUpdateConf(1, &net);
 

@@ -159,8 +159,7 @@ int32_t XAVOPrinterPrinterConfUnlock(int32_t fdLock) XAVOPRINTER_NOEXCEPT;
  * section-add result) with the last error set; ERR_LOCK when the lock
  * stayed busy (file untouched). */
 int32_t XAVOPrinterConfSetup(const UsbPrinterConf *pPrinterConf, int32_t blWriteEmpty) XAVOPRINTER_NOEXCEPT;
-/* Copies the printer's "cups printer name" into szBuf (cut to cbBuf - 1).
- * Returns 0 when it is set and non-empty; -1 when missing or empty, or
+/* Copies the printer's "cups printer name" into szBuf.  Returns 0 when it is set and non-empty; -1 when missing or empty, or
  * with ERR_BAD_PARAMETERS for a null argument or cbBuf <= 0. */
 int32_t XAVOPrinterCupsNameGet(const char *szPrinterId, char *szBuf, int32_t cbBuf) XAVOPRINTER_NOEXCEPT;
 
@@ -168,8 +167,7 @@ int32_t XAVOPrinterCupsNameGet(const char *szPrinterId, char *szBuf, int32_t cbB
  * An IEEE 1284 device ID string is pairs "KEY:value;"
  * ("MFG:ACME;MDL:Model 100;CMD:PCL,PJL;").  szStringId is writable: the
  * search changes one byte while it runs and restores it before returning.
- * Values are copied into szBuf cut to cbBuf - 1 characters and
- * NUL-terminated; on -1 szBuf is left unchanged. */
+ * Values are copied into szBuf; on -1 szBuf is left unchanged. */
 
 /* Copies the value of key szType, which includes its colon ("MDL:"; a
  * plain "MDL" would also match ":Model 100" and return ":Model 100"):
@@ -277,7 +275,7 @@ int32_t XAVOPrinterNetConfSetup(const NetPrinterConf *pNPConf, int32_t blWriteEm
 int32_t XAVOPrinterNetGetStringId(const char *szIP, char *szOutBuf, int32_t iOutSize) XAVOPRINTER_NOEXCEPT;
 /* Walks the printer's SNMP enterprises subtree for a printer URI.  On 0
  * szBackend holds "lpd", "ipp", "socket" or "bjnp" and szQName the remote
- * queue name (possibly empty), each cut to its size - 1.  Returns 1 when no
+ * queue name (possibly empty).  Returns 1 when no
  * accepted URI was printed, -1 on failure (szBackend may be written
  * then). */
 int32_t XAVOPrinterNetGetStringBackend(const char *szIP, char *szBackend, uint32_t cbBackend,
@@ -299,8 +297,7 @@ int32_t XAVOPrinterNetAvahiInfoGet(const char *szIP, NetPrinterInfo *pNPInfo) XA
  * the printer is not listed (record untouched); -1 on a bad argument or
  * after three failed attempts. */
 int32_t XAVOPrinterNetBjnpInfoGet(const char *szIP, NetPrinterInfo *pNPInfo) XAVOPRINTER_NOEXCEPT;
-/* Pings szIP and writes "Online" or "Offline" into szStatus, cut to
- * cbStatus - 1.  Returns 0 when a status was written; -1 on a bad argument
+/* Pings szIP and writes "Online" or "Offline" into szStatus.  Returns 0 when a status was written; -1 on a bad argument
  * or when ping could not be run or read (szStatus then unwritten or
  * unchanged). */
 int32_t XAVOPrinterNetPingStatus(const char *szIP, char *szStatus, int32_t cbStatus) XAVOPRINTER_NOEXCEPT;
@@ -375,8 +372,8 @@ int32_t XAVOPrinterCupsPrintTestPage(const char *szPrinterId) XAVOPRINTER_NOEXCE
  * callers poll. */
 int32_t XAVOPrinterCupsJobWaitComplete(const char *szPrinterId, const char *szJobId) XAVOPRINTER_NOEXCEPT;
 /* The USB/IP sharing service's queue text ("QUEUE" of "/tmp/usbip_<ID>")
- * with its remark in parentheses rewritten to "(CUPS Jobs...", in szBuf,
- * cut to cbBuf - 1.  Returns 0 when written (the raw text when it cannot
+ * with its remark in parentheses rewritten to "(CUPS Jobs...", in szBuf.
+ * Returns 0 when written (the raw text when it cannot
  * be rewritten), -1 on a bad argument or when the key cannot be read. */
 int32_t XAVOPrinterQueueGet(const char *szPrinterId, char *szBuf, int32_t cbBuf) XAVOPRINTER_NOEXCEPT;
 /* Cancels every job and empties the spool directory
@@ -403,8 +400,8 @@ int32_t XAVOPrinterGoogleInfoSet(const PrinterGoogleInfo *pInfo) XAVOPRINTER_NOE
 /* Asks the appliance's bind_driver to eject the printer from USB/IP
  * sharing.  Returns 0 when it reported success, else -1. */
 int32_t XAVOPrinterUsbipEject(const char *szPrinterId) XAVOPRINTER_NOEXCEPT;
-/* Copies the "LOCK" status of "/tmp/usbip_<szPrinterId>" into szBuf (cut
- * to cbBuf - 1), or "Free" when there is none.  Returns 0 whenever the
+/* Copies the "LOCK" status of "/tmp/usbip_<szPrinterId>" into szBuf, or
+ * "Free" when there is none.  Returns 0 whenever the
  * arguments are good, -1 (ERR_BAD_PARAMETERS) otherwise. */
 int32_t XAVOPrinterUsbipGetLockStatus(const char *szPrinterId, char *szBuf, int32_t cbBuf) XAVOPRINTER_NOEXCEPT;
 /* Asks the appliance's bind_driver to release the printer's USB/IP lock.

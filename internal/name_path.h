@@ -23,14 +23,17 @@ struct NamedFile {
 // program: where such a path is expanded, it names other printers' files.
 inline constexpr char kFilePatternChars[] = "*?[";
 
+// Whether a name stays in the directory it is placed in: it holds no "/".
+inline bool IsBaseName(const char *szName) { return std::strchr(szName, '/') == nullptr; }
+
 // Fills szPath[cbPath] with the prefix, the name and the suffix.  False,
 // with szPath emptied, when the name holds "/" or the whole path does not
 // fit: the buffers are those the appliance has always used, and a name too
 // long for them is refused rather than cut.
 inline bool NamePath(char *szPath, size_t cbPath, const NamedFile &file, const char *szName) {
     szPath[0] = '\0';
+    if (!IsBaseName(szName)) return false;
     const std::string_view name(szName);
-    if (name.find('/') != std::string_view::npos) return false;
     const size_t cbNeeded = file.prefix.size() + name.size() + file.suffix.size() + 1;
     if (cbNeeded > cbPath) return false;
     char *p = szPath;

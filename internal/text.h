@@ -1,5 +1,5 @@
 // Bounded copies into the fixed-size text fields of the appliance's
-// records.
+// records, and what a text must not hold to go into a line of a file.
 #pragma once
 
 #include <cstddef>
@@ -29,6 +29,20 @@ inline void CopyText(char (&dst)[N], std::string_view sv) {
 template <size_t N>
 inline std::string_view FieldText(const char (&field)[N]) {
     return std::string_view(field, strnlen(field, N));
+}
+
+// A control character (C0 or DEL): in a line of a file it would break the
+// line or hide what follows.
+inline bool IsControlChar(unsigned char c) { return c < 0x20 || c == 0x7f; }
+
+// Whether a text can be a key or a value of a table line KEY="VALUE" (the
+// USB and network printer tables): "=" and '"' split a line when it is
+// listed, a line break would add a line of its own.
+inline bool FitsTableLine(std::string_view text) {
+    for (unsigned char c : text) {
+        if (c == '=' || c == '"' || IsControlChar(c)) return false;
+    }
+    return true;
 }
 
 }  // namespace xavo

@@ -21,20 +21,11 @@ constexpr char kLogSmbFailed[] = "%s:%d update smb.conf failed, printer=%s[0x%04
 constexpr int32_t kHashCapacity = 1024;
 constexpr int32_t kListCapacity = 1024;
 
-// An address or name that the table's line cannot carry: "=" and '"' split
-// a line when it is listed, a line break would add a line of its own.
-bool FitsTableLine(std::string_view text) {
-    for (unsigned char c : text) {
-        if (c == '=' || c == '"' || c < 0x20 || c == 0x7f) return false;
-    }
-    return true;
-}
-
 // Writes the line ip="name"; false on failure with the error code set.
 bool SetEntry(const std::string &ip, const std::string &name) {
     // An entry without an address could never be told apart, and one that
     // breaks its line would add entries nobody asked for.
-    if (ip.empty() || !FitsTableLine(ip) || !FitsTableLine(name)) {
+    if (ip.empty() || !xavo::FitsTableLine(ip) || !xavo::FitsTableLine(name)) {
         XSETERR(ERR_BAD_PARAMETERS);
         return false;
     }

@@ -41,7 +41,7 @@ XAVO_EXPORT int32_t XAVOPrinterQueueGet(const char *szPrinterId, char *szBuf, in
         // holds "/" or does not fit whole is refused rather than cut into
         // another file's name.
         char szPath[kPathSize];
-        if (!XARG_OK(std::strchr(szPrinterId, '/') == nullptr, kCondNoSlash) ||
+        if (!XARG_OK(xavo::IsBaseName(szPrinterId), kCondNoSlash) ||
             !XARG_OK(xavo::NamePath(szPath, xavo::kUsbipStatus, szPrinterId), kCondPathFits)) {
             return -1;
         }

@@ -1,9 +1,10 @@
 // The sandbox's replacements of sleep(), usleep(), the open() family and
 // ioctl().  Linked into every test executable, which is linked with
 // -rdynamic: the dynamic linker then binds the calls of the library and of
-// the platform stand-ins to these definitions before libc's.  The same file
-// is built as the preloadable xavo_usblp_preload, for programs that run
-// outside a test executable but inside a sandbox.
+// the platform stand-ins to these definitions before libc's.  The same
+// files (this one, shared_state.cc and usblp_node.cc) are built as the
+// preloadable xavo_usblp_preload, for programs that run outside a test
+// executable but inside a sandbox.
 //
 // Only calls made through the PLT are seen.  libc's own internal opens
 // (fopen, std::ifstream, opendir) bypass the open() symbol, so a simulated
@@ -18,19 +19,16 @@
 #include <dlfcn.h>
 #include <fcntl.h>
 #include <sys/ioctl.h>
-#include <sys/mman.h>
-#include <sys/stat.h>
 #include <sys/syscall.h>
 #include <time.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <atomic>
 #include <cerrno>
 #include <cstdarg>
-#include <cstring>
 
 #include "sandbox/shared_state.h"
+#include "sandbox/usblp_node.h"
 
 extern "C" {
 int __open_2(const char *path, int flags);
@@ -41,40 +39,6 @@ int __openat64_2(int dirfd, const char *path, int flags);
 
 namespace xavo::test::detail {
 namespace {
-
-std::atomic<SharedState *> g_state{nullptr};
-
-// Raw system calls for the sandbox's own file work: they can never come
-// back into the interposers, whatever the loading order.
-int RawOpen(const char *path, int flags, mode_t mode = 0) {
-    return static_cast<int>(syscall(SYS_openat, AT_FDCWD, path, flags, mode));
-}
-void RawClose(int fd) { syscall(SYS_close, fd); }
-
-SharedState *MapStateFile() {
-    const int fd = RawOpen(kStatePath, O_RDWR | O_CLOEXEC);
-    if (fd < 0) return nullptr;
-    struct stat st {};
-    void *p = MAP_FAILED;
-    if (fstat(fd, &st) == 0 && static_cast<std::size_t>(st.st_size) >= sizeof(SharedState)) {
-        p = mmap(nullptr, sizeof(SharedState), PROT_READ | PROT_WRITE, MAP_SHARED, fd, 0);
-    }
-    RawClose(fd);
-    if (p == MAP_FAILED) return nullptr;
-    auto *s = static_cast<SharedState *>(p);
-    if (s->magic != kStateMagic) {
-        munmap(p, sizeof(SharedState));
-        return nullptr;
-    }
-    return s;
-}
-
-SharedState *Publish(SharedState *s) {
-    SharedState *expected = nullptr;
-    if (g_state.compare_exchange_strong(expected, s, std::memory_order_acq_rel)) return s;
-    munmap(s, sizeof(SharedState));
-    return expected;
-}
 
 // ---- the real functions --------------------------------------------------
 // dlsym(RTLD_NEXT) finds what would have been called without us (libc, or a
@@ -138,99 +102,6 @@ bool CountOnly(std::uint64_t us) {
     return s->realSleep.load(std::memory_order_acquire) == 0;
 }
 
-// ---- simulated usblp nodes -----------------------------------------------
-const char *DeviceName(const char *path) {
-    if (path == nullptr || std::strncmp(path, kUsbDevPrefix, sizeof(kUsbDevPrefix) - 1) != 0) return nullptr;
-    const char *name = path + sizeof(kUsbDevPrefix) - 1;
-    const std::size_t len = std::strlen(name);
-    if (len == 0 || len >= kMaxDevName) return nullptr;
-    return name;
-}
-
-DeviceSlot *FindSlot(SharedState *s, const char *name) {
-    for (DeviceSlot &d : s->devices) {
-        if (d.used.load(std::memory_order_acquire) == 1 && std::strcmp(d.name, name) == 0) return &d;
-    }
-    return nullptr;
-}
-
-DeviceSlot *SlotOfDescriptor(SharedState *s, int fd) {
-    bool any = false;
-    for (DeviceSlot &d : s->devices) any = any || d.used.load(std::memory_order_acquire) == 1;
-    if (!any) return nullptr;
-    struct stat st {};
-    if (fstat(fd, &st) != 0 || !S_ISREG(st.st_mode)) return nullptr;
-    for (DeviceSlot &d : s->devices) {
-        if (d.used.load(std::memory_order_acquire) == 1 &&
-            d.nodeDev.load(std::memory_order_acquire) == static_cast<std::uint64_t>(st.st_dev) &&
-            d.nodeIno.load(std::memory_order_acquire) == static_cast<std::uint64_t>(st.st_ino)) {
-            return &d;
-        }
-    }
-    return nullptr;
-}
-
-// Takes one from a "the next N fail" counter; true when one was left.
-bool TakeOne(std::atomic<int> &counter) {
-    int n = counter.load(std::memory_order_acquire);
-    while (n > 0) {
-        if (counter.compare_exchange_weak(n, n - 1, std::memory_order_acq_rel)) return true;
-    }
-    return false;
-}
-
-int Fail(int e) {
-    errno = e;
-    return -1;
-}
-
-// open() of "/dev/usb/<name>".  A device that was never configured does not
-// exist.  A present one is opened as its node file, a regular file on the
-// sandbox's /dev, which ioctl() recognises again by device and inode.
-template <class OpenReal>
-int OpenDevice(SharedState *s, const char *name, int flags, OpenReal openReal) {
-    DeviceSlot *d = FindSlot(s, name);
-    if (d == nullptr) return Fail(ENOENT);
-    d->opens.fetch_add(1, std::memory_order_acq_rel);
-    d->lastOpenFlags.store(flags, std::memory_order_release);
-    if (d->present.load(std::memory_order_acquire) == 0) return Fail(ENOENT);
-    if (TakeOne(d->busyOpens)) return Fail(EBUSY);
-    return openReal(flags & ~(O_CREAT | O_EXCL | O_TRUNC));
-}
-
-constexpr unsigned kIocRead = 2;
-constexpr unsigned kDeviceIdNr = 1;
-constexpr std::uint32_t kSoftReset = 0x5009;
-constexpr std::uint32_t kEnableRequest = 0x40005008;
-constexpr std::uint32_t kDisableRequest = 0x40005007;
-
-int DeviceIoctl(DeviceSlot *d, unsigned long request, void *arg) {
-    const auto req = static_cast<std::uint32_t>(request);
-    const std::uint32_t i = d->requestCount.fetch_add(1, std::memory_order_acq_rel);
-    if (i < kMaxRequests) d->requests[i].store(req, std::memory_order_release);
-    // A device unplugged under an open descriptor answers nothing more.
-    if (d->present.load(std::memory_order_acquire) == 0) return Fail(ENODEV);
-
-    const unsigned dir = req >> 30;
-    const std::size_t size = (req >> 16) & 0x3fff;
-    const unsigned type = (req >> 8) & 0xff;
-    const unsigned nr = req & 0xff;
-    if (type == 'P' && nr == kDeviceIdNr && dir == kIocRead) {
-        // The device ID request of any buffer size: the driver copies the
-        // reply's bytes as they came from the device, no more than the
-        // request's size, and leaves the length bytes for the caller to
-        // judge (they may state more than was copied).
-        if (TakeOne(d->deviceIdFailures)) return Fail(EIO);
-        if (arg == nullptr) return Fail(EFAULT);
-        const std::size_t n = std::min<std::size_t>(d->replyLen.load(std::memory_order_acquire), size);
-        std::memcpy(arg, d->reply, n);
-        return 0;
-    }
-    if (req == kSoftReset) return d->resetAccepted.load(std::memory_order_acquire) != 0 ? 0 : Fail(EIO);
-    if (req == kEnableRequest || req == kDisableRequest) return 0;
-    return Fail(ENOTTY);
-}
-
 mode_t ModeArg(int flags, va_list ap) {
     if ((flags & O_CREAT) != 0 || (flags & O_TMPFILE) == O_TMPFILE) return static_cast<mode_t>(va_arg(ap, int));
     return 0;
@@ -280,27 +151,6 @@ int OpenAt2Common(const char *fnName, std::atomic<void *> &cache, int dirfd, con
 }
 
 }  // namespace
-
-SharedState *State() {
-    if (SharedState *s = g_state.load(std::memory_order_acquire)) return s;
-    SharedState *s = MapStateFile();
-    return s != nullptr ? Publish(s) : nullptr;
-}
-
-SharedState *CreateState() {
-    if (SharedState *s = g_state.load(std::memory_order_acquire)) return s;
-    const int fd = RawOpen(kStatePath, O_RDWR | O_CREAT | O_EXCL | O_CLOEXEC, 0666);
-    if (fd < 0) return nullptr;
-    void *p = MAP_FAILED;
-    if (ftruncate(fd, static_cast<off_t>(sizeof(SharedState))) == 0) {
-        p = mmap(nullptr, sizeof(SharedState), PROT_READ | PROT_WRITE, MAP_SHARED, fd, 0);
-    }
-    RawClose(fd);
-    if (p == MAP_FAILED) return nullptr;
-    auto *s = static_cast<SharedState *>(p);  // a new file reads as zeros: all counters 0
-    s->magic = kStateMagic;
-    return Publish(s);
-}
 
 }  // namespace xavo::test::detail
 
@@ -371,7 +221,7 @@ int ioctl(int fd, unsigned long request, ...) noexcept {
     va_end(ap);
     // A simulated device was opened through State(), so the mapping exists
     // whenever a descriptor can be one of ours.
-    if (SharedState *s = g_state.load(std::memory_order_acquire)) {
+    if (SharedState *s = MappedState()) {
         if (DeviceSlot *d = SlotOfDescriptor(s, fd)) return DeviceIoctl(d, request, arg);
     }
     return RealIoctl(fd, request, arg);

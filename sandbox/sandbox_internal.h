@@ -15,6 +15,20 @@ void MakeDirs(const std::string &path, mode_t mode = 0755);
 // Removes a tree below and including path; missing is fine.
 void RemoveTree(const std::string &path);
 
+// A sandbox that cannot be set up must not run a test: the message goes to
+// stderr and the process ends with exit code 70.
+[[noreturn]] void Die(const std::string &what, int err);
+// Die(what, errno) unless ok.
+void Must(bool ok, const std::string &what);
+
+// The writable layers (layers.cc).  RememberHostDirs() notes the host's
+// directories before anything is mounted over them; BuildDev() puts the
+// private /dev in place once; FreshLayers() replaces the overlays and tmpfs
+// and lays out what the appliance has at boot.
+void RememberHostDirs();
+void BuildDev();
+void FreshLayers();
+
 // syslog capture on the sandbox's /dev/log.
 void StartLogCapture();
 void ClearLogs();
@@ -30,6 +44,9 @@ void ResetSleeps();
 
 // Suites registered with XAVO_SANDBOX_PER_SUITE.
 bool IsPerSuite(const std::string &suite);
+// Whether this process built the sandbox (rather than joined it or never
+// entered one): only the builder renews it and stops what is left.
+bool OwnsSandbox();
 // Tells on stderr which processes started in the sandbox still run after
 // "what" ended.
 void ReportLeftovers(const std::string &what);

@@ -73,5 +73,9 @@ static_assert(alignof(std::atomic<std::uint64_t>) == 8 && sizeof(DeviceSlot) % 8
 SharedState *State();
 // Creates the state file in the control directory and maps it.
 SharedState *CreateState();
+// The mapping when this process has made it already, else nullptr, without
+// looking for the file: for ioctl(), which only a descriptor opened through
+// State() can concern.
+SharedState *MappedState();
 
 }  // namespace xavo::test::detail

@@ -1,5 +1,6 @@
 // The simulated usblp devices and the sleep records, as the tests see them.
-// The interposers in interpose.cc act on the same shared state.
+// The interposers (interpose.cc, usblp_node.cc) act on the same shared
+// state.
 #include <dirent.h>
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -15,6 +16,7 @@
 #include "sandbox/sandbox.h"
 #include "sandbox/sandbox_internal.h"
 #include "sandbox/shared_state.h"
+#include "sandbox/usblp_node.h"
 
 namespace xavo::test {
 namespace detail {
@@ -34,13 +36,6 @@ SharedState &Shared() {
 // device goes and comes back, as a real one does across a driver unbind.
 std::string StoreNode(const SharedState &s, const DeviceSlot &d) {
     return kNodeStore + std::to_string(&d - s.devices);
-}
-
-DeviceSlot *Find(SharedState &s, const std::string &name) {
-    for (DeviceSlot &d : s.devices) {
-        if (d.used.load() == 1 && name == d.name) return &d;
-    }
-    return nullptr;
 }
 
 void ClearSlot(DeviceSlot &d) {
@@ -65,7 +60,7 @@ void CheckName(const std::string &name) {
 }
 
 DeviceSlot &Claim(SharedState &s, const std::string &name) {
-    if (DeviceSlot *d = Find(s, name)) return *d;
+    if (DeviceSlot *d = FindSlot(&s, name.c_str())) return *d;
     for (DeviceSlot &d : s.devices) {
         if (d.used.load() != 0) continue;
         ClearSlot(d);
@@ -157,7 +152,7 @@ void SetUsblp(const std::string &devName, const UsblpConfig &config) {
 UsblpSeen GetUsblp(const std::string &devName) {
     UsblpSeen seen;
     SharedState &s = Shared();
-    DeviceSlot *d = Find(s, devName);
+    DeviceSlot *d = FindSlot(&s, devName.c_str());
     if (d == nullptr) return seen;
     seen.opens = d->opens.load();
     seen.lastOpenFlags = d->lastOpenFlags.load();

@@ -17,9 +17,8 @@ tar -C . --exclude=./.git --exclude='./build*' --exclude='./_*' -cf - . | tar -C
 
 # Reused objects make a rebuild of unchanged sources cheap; the package is
 # the same without.
-if command -v ccache >/dev/null; then
-  export CMAKE_C_COMPILER_LAUNCHER=ccache CMAKE_CXX_COMPILER_LAUNCHER=ccache
-fi
+. scripts/checks.sh
+use_ccache
 export DEB_BUILD_OPTIONS="parallel=$(nproc) ${DEB_BUILD_OPTIONS:-}"
 (cd "$out/src" && dpkg-buildpackage -us -uc -b) >"$out/build.log" 2>&1 || {
   tail -n 40 "$out/build.log" >&2

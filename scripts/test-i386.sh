@@ -7,9 +7,6 @@
 set -euo pipefail
 cd "$(dirname "$0")/.."
 
-dir=build/i386
-echo "== i386: configure and build"
-cmake -S . -B "$dir" -G Ninja --toolchain cmake/i386-linux-gnu.cmake -DCMAKE_BUILD_TYPE=RelWithDebInfo >/dev/null
-cmake --build "$dir" -j "$(nproc)"
-echo "== i386: test"
-ctest --test-dir "$dir" --output-on-failure -j 1
+. scripts/checks.sh
+build_tree i386 build/i386 --toolchain cmake/i386-linux-gnu.cmake -DCMAKE_BUILD_TYPE=RelWithDebInfo
+test_tree i386 build/i386

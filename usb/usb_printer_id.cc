@@ -17,7 +17,7 @@ constexpr char kPrinterIdFormat[] = "%04" PRIx32 ":%04" PRIx32 ":%s";
 // header line.  Such a device has no usable printer ID.
 bool FitsSectionName(std::string_view id) {
     for (unsigned char c : id) {
-        if (c < 0x20 || c == 0x7f) return false;
+        if (IsControlChar(c)) return false;
     }
     return !id.empty();
 }
