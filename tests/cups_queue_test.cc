@@ -126,24 +126,6 @@ TEST_F(CupsQueues, GivenPpdIsKeptByPrinterIdAndServesLaterCreations) {
     EXPECT_FALSE(Queue("usbprinter2").exists);
 }
 
-// A serial number that makes the ID a file name pattern: the copy is refused
-// as a bad argument, another printer's kept copy stays, and the queue is
-// made from the caller's file all the same.
-TEST_F(CupsQueues, PatternInThePrinterIdNeverOverwritesAnotherKeptCopy) {
-    const char kPatternId[] = "04b8:0005:SN*";
-    PlaceFile(kConf, ReadFile(kConf) + "\n[" + kPatternId + "]\n\tproducer = ACME\n");  // registered
-    PlaceFile("/etc/cups/ppd/04b8:0005:SN0001.ppd", "OTHER PRINTER");
-    PlaceFile("/tmp/new.ppd", kPpdText);
-    ASSERT_EQ(XAVOPrinterCupsAdd(kPatternId, "/tmp/new.ppd"), 0);
-    EXPECT_EQ(ReadFile("/etc/cups/ppd/04b8:0005:SN0001.ppd"), "OTHER PRINTER");
-    EXPECT_FALSE(FileExists("/etc/cups/ppd/04b8:0005:SN*.ppd"));
-    EXPECT_THAT(Logs(), Contains(StartsWith("3 printer_cups_printer_add:N Failed to backup ppd file: "
-                                            "/tmp/new.ppd[0x0D00 printer_backup_ppd:")));
-    EXPECT_EQ(Queue("usbprinter1").deviceUri, std::string("usb:/dev/usb/") + kPatternId);
-    EXPECT_TRUE(FileExists("/etc/cups/ppd/usbprinter1.ppd"));  // CUPS's own copy of the caller's file
-    EXPECT_EQ(StoredName(kPatternId), "usbprinter1");
-}
-
 TEST_F(CupsQueues, NetworkQueueIsCreatedEnabledWithItsPpd) {
     PlaceFile("/tmp/model.ppd", kPpdText);
     NetPrinterConf conf = NetRecord("10.0.0.11", "office", "socket");
@@ -227,17 +209,3 @@ TEST_F(CupsQueues, SchedulerFileLosesExactlyTheUsbBlocksWhileStopped) {
     EXPECT_EQ(Tool({"/usr/bin/lpstat", "-v"}), "device for usbprinter12: socket://10.0.0.12/\n");
 }
 
-// A USB printer's ID holds the serial number the printer reports: text the
-// printer controls, which never becomes a file name pattern.  Whether the
-// ID's own copy is kept or refused, SN0001's copy stays as it was.
-TEST_F(CupsQueues, PrinterIdHoldingPatternCharactersNeverReachesAnotherPrintersPpd) {
-    const char *szId = "04b8:0005:SN*";
-    const std::string kept = std::string("/etc/cups/ppd/") + kA + ".ppd";
-    PlaceFile(kept, "OTHER PRINTER");
-    PlaceFile("/tmp/new.ppd", kPpdText);
-    PlaceFile(kConf, ReadFile(kConf) + "\n[" + szId + "]\n\tproducer = ACME\n");
-    XAVOPrinterCupsAdd(szId, "/tmp/new.ppd");
-    EXPECT_EQ(ReadFile(kept), "OTHER PRINTER");
-    const std::string own = std::string("/etc/cups/ppd/") + szId + ".ppd";
-    EXPECT_TRUE(!FileExists(own) || ReadFile(own) == kPpdText);
-}
