@@ -10,7 +10,6 @@
 
 #include "support/fault_sweep.h"
 #include "support/logs.h"
-#include "support/processes.h"
 #include "support/sections.h"
 #include "xavoprinter.h"
 
@@ -127,38 +126,6 @@ TEST(PrinterCupsNameGet, BadArgumentsFailSilentlyWithBadParameters) {
         EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
     }
     EXPECT_THAT(Logs(), IsEmpty());
-}
-
-// Several processes setting up printers at once: every key of every process
-// is in the file afterwards.  Each process owns some printers of its own and
-// one key of a printer they all share, so a setup that merged into a stale
-// copy of the shared section would drop another process's key.
-TEST(PrinterConfSetup, ConcurrentProcessesLoseNothing) {
-    constexpr int kProcesses = 8;
-    constexpr int kOwnPrinters = 4;
-    const char *sharedKeys[kProcesses] = {"producer", "product name", "mode", "driver",
-                                          "driver brand", "usblp string id", "fit to page", "enable airprint"};
-    xavo::test::RunAtOnce(kProcesses, [](int p) {
-        bool ok = true;
-        for (int i = 0; i < kOwnPrinters; ++i) {
-            UsbPrinterConf conf = Record(("p" + std::to_string(p) + "-" + std::to_string(i)).c_str());
-            std::snprintf(conf.szProducer, sizeof conf.szProducer, "maker %d", p);
-            ok &= XAVOPrinterConfSetup(&conf, 0) == 0;
-        }
-        UsbPrinterConf shared = Record("shared");
-        char *fields[kProcesses] = {shared.szProducer, shared.szProductName, shared.szMode,
-                                    shared.szDriver, shared.szDriverBrand, shared.szUsblpStringId,
-                                    shared.szFitToPage, shared.szEnableAirprint};
-        std::snprintf(fields[p], 8, "v%d", p);
-        return ok && XAVOPrinterConfSetup(&shared, 0) == 0;
-    });
-    for (int p = 0; p < kProcesses; ++p) {
-        for (int i = 0; i < kOwnPrinters; ++i) {
-            std::string id = "p" + std::to_string(p) + "-" + std::to_string(i);
-            EXPECT_EQ(ReadSection(id.c_str()), (Section{{"producer", "maker " + std::to_string(p)}})) << id;
-        }
-        EXPECT_EQ(ReadSection("shared")[sharedKeys[p]], "v" + std::to_string(p)) << sharedKeys[p];
-    }
 }
 
 // Every platform call of a setup failed in turn: the setup fails cleanly
