@@ -10,6 +10,7 @@
 
 #include "support/fault_sweep.h"
 #include "support/logs.h"
+#include "support/paths.h"
 #include "support/sections.h"
 #include "xavoprinter.h"
 
@@ -18,11 +19,11 @@ using ::testing::ElementsAre;
 using ::testing::HasSubstr;
 using ::testing::IsEmpty;
 using ::testing::Not;
+using xavo::test::kConf;
 using xavo::test::Logs;
 
 namespace {
 
-constexpr char kConf[] = "/usr/xavo/etc/printer.conf";
 constexpr char kSection[] = "Google Cloud Print";
 constexpr char kPassword[] = "pa55-Word_of_the_owner";
 constexpr char kToken[] = "1//0refresh-token-of-the-account";

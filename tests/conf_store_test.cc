@@ -10,16 +10,17 @@
 
 #include "support/fault_sweep.h"
 #include "support/logs.h"
+#include "support/paths.h"
 #include "support/sections.h"
 #include "xavoprinter.h"
 
 using ::testing::ElementsAre;
 using ::testing::IsEmpty;
+using xavo::test::kConf;
 using xavo::test::Logs;
 
 namespace {
 
-constexpr char kConf[] = "/usr/xavo/etc/printer.conf";
 constexpr char kPrinter[] = "04b8:0005:SN0001";
 
 using xavo::test::Section;

@@ -14,6 +14,7 @@
 #include "sandbox/cupsd.h"
 #include "support/cases.h"
 #include "support/logs.h"
+#include "support/paths.h"
 #include "support/records.h"
 #include "xavoprinter.h"
 
@@ -30,7 +31,6 @@ using namespace xavo::test;
 namespace {
 
 constexpr char kA[] = "04b8:0005:SN0001";
-constexpr char kPrintersConf[] = "/etc/cups/printers.conf";
 // A program that appends its name and arguments to /tmp/runs.
 std::string Recorder(int iExit) {
     return "#!/bin/sh\necho \"${0##*/} $*\" >> /tmp/runs\nexit " + std::to_string(iExit) + "\n";
@@ -49,7 +49,7 @@ protected:
         ASSERT_GT(Cupsd::Pid(), 0);
         Cupsd::RemoveAllQueues();
         Tool({"/bin/sh", "-c", "rm -f /tmp/runs /usr/xavo/etc/printer.conf /etc/cups/ppd/*"});
-        PlaceFile("/usr/xavo/etc/nptab", "10.0.0.11=\"office\"\n");
+        PlaceFile(kNptab, "10.0.0.11=\"office\"\n");
         XavoStandinReset();
         ORLICErrSetEx(0, "", 0);
         Logs();
@@ -182,18 +182,18 @@ TEST_F(CupsFaults, SchedulerFileEditDropsExactlyTheUsbBlocks) {
         {std::string(1500, 'x') + "\n<Printer usbprinter>\n</Printer>\n", std::string(1500, 'x') + "\n"},
     };
     for (const auto &c : cases) {
-        PlaceFile(kPrintersConf, c.before, 0640);
+        PlaceFile(kCupsConf, c.before, 0640);
         EXPECT_EQ(XAVOPrinterCupsUsbConfRmAll(), 0);
-        EXPECT_EQ(ReadFile(kPrintersConf), c.after);
+        EXPECT_EQ(ReadFile(kCupsConf), c.after);
     }
-    PlaceFile(kPrintersConf, head);
+    PlaceFile(kCupsConf, head);
     XavoStandinFailCall("ORLICFileTempFileOpen", 1, ERR_OPEN);
     EXPECT_EQ(XAVOPrinterCupsUsbConfRmAll(), -1);
     EXPECT_EQ(ORLICErrGet(), ERR_OPEN);
-    EXPECT_EQ(ReadFile(kPrintersConf), head);
-    unlink(kPrintersConf);
+    EXPECT_EQ(ReadFile(kCupsConf), head);
+    unlink(kCupsConf);
     EXPECT_EQ(XAVOPrinterCupsUsbConfRmAll(), 0);
-    EXPECT_FALSE(FileExists(kPrintersConf));
+    EXPECT_FALSE(FileExists(kCupsConf));
     EXPECT_TRUE(Logs().empty());
 }
 

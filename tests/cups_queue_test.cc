@@ -9,6 +9,7 @@
 
 #include "sandbox/cupsd.h"
 #include "support/logs.h"
+#include "support/paths.h"
 #include "support/records.h"
 #include "xavoprinter.h"
 
@@ -19,7 +20,6 @@ using namespace xavo::test;
 
 namespace {
 
-constexpr char kConf[] = "/usr/xavo/etc/printer.conf";
 constexpr char kA[] = "04b8:0005:SN0001";
 constexpr char kB[] = "04b8:0005:SN0002";
 // As small a driver file as the scheduler accepts.
@@ -148,7 +148,7 @@ TEST_F(CupsQueues, LookupsMatchNamesAndAddressesInTheRealQueueList) {
     Lpadmin("office12", "lpd://10.0.0.12/raw");
     Lpadmin("usbprinter1", std::string("usb:/dev/usb/") + kA);
     // The lookups by address only read CUPS when the appliance has printers.
-    PlaceFile("/usr/xavo/etc/nptab", "10.0.0.11=\"office\"\n");
+    PlaceFile(kNptab, "10.0.0.11=\"office\"\n");
     struct { const char *szIp; int32_t iExpected; } const ipCases[] = {
         {"10.0.0.11", 0}, {"10.0.0.12", 0}, {"10.0.0.1", 1}, {"", 0}};
     for (const auto &c : ipCases) EXPECT_EQ(XAVOPrinterNetIPCheck(c.szIp), c.iExpected) << c.szIp;
@@ -161,7 +161,7 @@ TEST_F(CupsQueues, LookupsMatchNamesAndAddressesInTheRealQueueList) {
         {kA, "usbprinter1", 1}, {kB, "usbprinter1", 2}, {kA, "usbprinter", 1}, {kA, "office", 2}, {kA, "usbprinter2", 0}};
     for (const auto &c : usbCases) EXPECT_EQ(XAVOPrinterCupsNameCheck(c.szId, c.szName), c.iExpected) << c.szName;
     // No printers registered: the address lookups answer "free" unasked.
-    unlink("/usr/xavo/etc/nptab");
+    unlink(kNptab);
     EXPECT_EQ(XAVOPrinterNetIPCheck("10.0.0.11"), 1);
     EXPECT_EQ(XAVOPrinterNetCupsNameAndIPCheck("10.0.0.11", "office"), 0);
     EXPECT_TRUE(TakeSleeps().empty());
@@ -194,12 +194,12 @@ TEST_F(CupsQueues, SchedulerFileLosesExactlyTheUsbBlocksWhileStopped) {
 
     Cupsd::Stop();
     struct stat old;
-    ASSERT_EQ(stat("/etc/cups/printers.conf", &old), 0);
+    ASSERT_EQ(stat(kCupsConf, &old), 0);
     ASSERT_EQ(XAVOPrinterCupsUsbConfRmAll(), 0);
     // Replaced by a new file, not rewritten in place, with the temporary
     // file's own mode; nothing is left beside it.
     struct stat now;
-    ASSERT_EQ(stat("/etc/cups/printers.conf", &now), 0);
+    ASSERT_EQ(stat(kCupsConf, &now), 0);
     EXPECT_NE(now.st_ino, old.st_ino);
     EXPECT_EQ(now.st_mode & 07777, 0600u);
     EXPECT_EQ(Tool({"/bin/sh", "-c", "ls /etc/cups | grep -c '^printers.conf.......$'"}), "0\n");

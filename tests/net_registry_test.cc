@@ -10,6 +10,7 @@
 
 #include "support/fault_sweep.h"
 #include "support/logs.h"
+#include "support/paths.h"
 #include "support/records.h"
 #include "support/sections.h"
 #include "xavoprinter.h"
@@ -21,9 +22,6 @@ using namespace xavo::test;
 
 namespace {
 
-constexpr char kConf[] = "/usr/xavo/etc/printer.conf";
-constexpr char kNptab[] = "/usr/xavo/etc/nptab";
-constexpr char kSmbConf[] = "/etc/samba/smb.reserved.conf";
 constexpr char kPrinter[] = "10.0.0.5-office";
 
 // Over a stored "QName": lpd and ipp write the record's remote queue when it

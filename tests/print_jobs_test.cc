@@ -15,6 +15,7 @@
 #include "support/cases.h"
 #include "support/fault_sweep.h"
 #include "support/logs.h"
+#include "support/paths.h"
 #include "support/processes.h"
 #include "xavoprinter.h"
 
@@ -29,7 +30,6 @@ using namespace xavo::test;
 
 namespace {
 
-constexpr char kConf[] = "/usr/xavo/etc/printer.conf";
 constexpr char kPrinter[] = "04b8:0005:SN0001";
 constexpr char kQueue[] = "usbprinter1";
 constexpr char kSpool[] = "/var/services/printer";

@@ -20,6 +20,7 @@
 
 #include "appliance/standin_control.h"
 #include "sandbox/sandbox.h"
+#include "support/paths.h"
 #include "support/processes.h"
 #include "xavocore.h"
 #include "xavoprinter.h"
@@ -87,7 +88,7 @@ void PlaceTools() {
     PlaceTool("/usr/bin/bind_driver", "[ \"$2\" = failing ] && exit 1\nexit 0\n");
     PlaceTool("/usr/bin/lpr", "exit 0\n");
     PlaceTool("/usr/bin/lprm", "exit 0\n");
-    PlaceFile("/usr/xavo/etc/printer.conf", std::string("[") + kPrinter + "]\n\tcups printer name = usbprinter1\n");
+    PlaceFile(kConf, std::string("[") + kPrinter + "]\n\tcups printer name = usbprinter1\n");
     PlaceFile("/tmp/doc.txt", "text\n");
 }
 

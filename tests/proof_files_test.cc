@@ -21,6 +21,7 @@
 #include <vector>
 
 #include "internal/guards.h"
+#include "support/paths.h"
 #include "support/processes.h"
 #include "support/proof_tally.h"
 #include "support/records.h"
@@ -31,11 +32,6 @@ using namespace xavo::test;
 
 namespace {
 
-constexpr char kConf[] = "/usr/xavo/etc/printer.conf";
-constexpr char kNptab[] = "/usr/xavo/etc/nptab";
-constexpr char kUsbtab[] = "/tmp/usbtab";
-constexpr char kSmbConf[] = "/etc/samba/smb.reserved.conf";
-constexpr char kCupsConf[] = "/etc/cups/printers.conf";
 constexpr char kKvFmt[] = "%s=\"%s\"\n";
 constexpr char kSectionFmt[] = "\t%s = %s\n";
 

@@ -19,6 +19,7 @@
 #include <vector>
 
 #include "support/cases.h"
+#include "support/paths.h"
 #include "support/proof_tally.h"
 #include "support/records.h"
 #include "support/sections.h"
@@ -28,12 +29,7 @@ using namespace xavo::test;
 
 namespace {
 
-constexpr char kConf[] = "/usr/xavo/etc/printer.conf";
-constexpr char kNptab[] = "/usr/xavo/etc/nptab";
-constexpr char kUsbtab[] = "/tmp/usbtab";
 constexpr char kUsbtabLock[] = "/tmp/.usbtab.lock";
-constexpr char kSmbConf[] = "/etc/samba/smb.reserved.conf";
-constexpr char kCupsConf[] = "/etc/cups/printers.conf";
 constexpr char kPrinter[] = "04b8:0005:SN0001";
 constexpr char kVictim[] = "/root/victim";
 constexpr char kTmpVictim[] = "/tmp/roots-file";  // on /tmp's file system

@@ -17,6 +17,7 @@
 #include "sandbox/avahi.h"
 #include "sandbox/cupsd.h"
 #include "sandbox/snmpd.h"
+#include "support/paths.h"
 #include "support/records.h"
 #include "support/written_files.h"
 #include "xavoprinter.h"
@@ -241,7 +242,7 @@ std::vector<Channel> Channels(const std::vector<NetPrinterInfo> &mdnsInfo) {
              // queue's name is written under it.
              ORLICSzHash *hash = ORLICSzHashAlloc(8);
              ORLICSzHashSetValue(&hash, "mode", "usbip");
-             ORLICFileAddSection(kPrinterConfFile, p.c_str(), hash, "\t%s = %s\n");
+             ORLICFileAddSection(kConf, p.c_str(), hash, "\t%s = %s\n");
              ORLICSzHashFree(hash);
              XAVOPrinterCupsAdd(p.c_str(), nullptr);
              return Expected::Usb(p);
@@ -289,7 +290,7 @@ TEST(ProofInjection, NoSectionKeyOrLineOfOutsideTextInAnyFileTheLibraryWrites) {
             const std::vector<std::string> found = Injections(expected);
             ++tried;
             if (payloads[i].text == kPlain && channel.bShowsText) {
-                const std::string written = ReadFile(kPrinterConfFile) + ReadFile(kNptabFile) + ReadFile(kUsbtabFile);
+                const std::string written = ReadFile(kConf) + ReadFile(kNptab) + ReadFile(kUsbtab);
                 EXPECT_NE(written.find(kPlain), std::string::npos) << channel.szName << " carried nothing";
             }
             if (found.empty()) continue;

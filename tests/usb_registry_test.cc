@@ -17,6 +17,7 @@
 #include "sandbox/cupsd.h"
 #include "support/fault_sweep.h"
 #include "support/logs.h"
+#include "support/paths.h"
 #include "support/processes.h"
 #include "support/sections.h"
 #include "xavoprinter.h"
@@ -26,9 +27,6 @@ using namespace xavo::test;
 
 namespace {
 
-constexpr char kConf[] = "/usr/xavo/etc/printer.conf";
-constexpr char kUsbtab[] = "/tmp/usbtab";
-constexpr char kSmbConf[] = "/etc/samba/smb.reserved.conf";
 constexpr char kPrinter[] = "04b8:0005:SN0001";
 constexpr char kDeviceId[] = "MFG:ACME;MDL:Model 100 Pro;CMD:ESCPL2;";
 constexpr char kUsbIdMapLock[] = "/run/xavosdk/lock/LOCK_USBIDMAP";
@@ -249,7 +247,7 @@ TEST(UsbPrinterListing, DeviceNamesIdsAndCountsFollowTheTable) {
     Plug("lp0", "1-1");
     Plug("lp1", "1-2", "");  // no serial: the USB library gives no printer ID
     PlaceFile(kUsbtab, "lp0=\"1-1\"\nlp1=\"1-2\"\n");
-    PlaceFile("/usr/xavo/etc/nptab", "10.0.0.5=\"office\"\n");
+    PlaceFile(kNptab, "10.0.0.5=\"office\"\n");
     char **names = static_cast<char **>(std::malloc(8));  // an earlier array, released by the call
     int32_t count = -1;
     ASSERT_EQ(XAVOPrinterUsbtabEnum(&names, &count), 0);
