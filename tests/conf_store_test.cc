@@ -11,6 +11,7 @@
 #include "support/fault_sweep.h"
 #include "support/logs.h"
 #include "support/paths.h"
+#include "support/records.h"
 #include "support/sections.h"
 #include "xavoprinter.h"
 
@@ -18,6 +19,7 @@ using ::testing::ElementsAre;
 using ::testing::IsEmpty;
 using xavo::test::kConf;
 using xavo::test::Logs;
+using xavo::test::UsbRecord;
 
 namespace {
 
@@ -27,13 +29,6 @@ using xavo::test::Section;
 
 Section ReadSection(const char *szSection) { return xavo::test::ReadSection(kConf, szSection); }
 void WriteSection(const char *szSection, const Section &keys) { xavo::test::WriteSection(kConf, szSection, keys); }
-
-UsbPrinterConf Record(const char *szPrinterId) {
-    UsbPrinterConf conf;
-    std::memset(&conf, 0, sizeof conf);
-    std::strcpy(conf.szPrinterId, szPrinterId);
-    return conf;
-}
 
 // A stored section in which every key the record can carry has a value,
 // plus keys the record does not carry.
@@ -56,7 +51,7 @@ TEST(PrinterConfSetup, FilledFieldsReplaceAndEmptyOnesClearOnlyTheClearableKeysW
         for (int blWriteEmpty : {0, 1}) {
             xavo::test::ResetSandbox();
             if (!stored.empty()) WriteSection(kPrinter, stored);
-            UsbPrinterConf conf = Record(kPrinter);
+            UsbPrinterConf conf = UsbRecord(kPrinter);
             std::strcpy(conf.szProductName, "Model 100");
             std::strcpy(conf.szMode, "usbip");
             std::strcpy(conf.szDriver, "new.ppd");
@@ -84,7 +79,7 @@ TEST(PrinterConfLock, BusyLockIsTriedAHundredTimesAndTakenAtOnceWhenReleased) {
     xavo::test::TakeSleeps();
     EXPECT_EQ(XAVOPrinterPrinterConfLock(), -1);
     EXPECT_EQ(xavo::test::TakeSleeps(), std::vector<std::uint64_t>(100, 50000));
-    UsbPrinterConf conf = Record(kPrinter);
+    UsbPrinterConf conf = UsbRecord(kPrinter);
     std::strcpy(conf.szProducer, "New");
     EXPECT_EQ(XAVOPrinterConfSetup(&conf, 1), -1);
     EXPECT_EQ(ORLICErrGet(), ERR_LOCK);
@@ -136,7 +131,7 @@ TEST(PrinterConfSetup, EachPlatformFailureFailsCleanly) {
     xavo::test::SweepFailures(
         [] { WriteSection(kPrinter, kStored); },
         [] {
-            UsbPrinterConf conf = Record(kPrinter);
+            UsbPrinterConf conf = UsbRecord(kPrinter);
             std::strcpy(conf.szProducer, "New");
             return XAVOPrinterConfSetup(&conf, 0);
         },
