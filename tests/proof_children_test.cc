@@ -11,7 +11,6 @@
 #include <unistd.h>
 
 #include <chrono>
-#include <cstdio>
 #include <cstring>
 #include <functional>
 #include <string>
@@ -22,6 +21,7 @@
 #include "sandbox/sandbox.h"
 #include "support/paths.h"
 #include "support/processes.h"
+#include "support/proof_tally.h"
 #include "xavocore.h"
 #include "xavoprinter.h"
 
@@ -32,18 +32,6 @@ namespace {
 constexpr char kPrinter[] = "04b8:0005:SN0001";
 constexpr double kGrace = 2.0;  // the runner's SIGTERM-to-SIGKILL grace
 constexpr double kSlack = 1.5;  // a loaded machine's delay on top
-
-struct Tally {
-    int tried = 0;
-    int failed = 0;
-    void Check(bool bOk, const std::string &what) {
-        ++tried;
-        if (!bOk) {
-            ++failed;
-            ADD_FAILURE() << what;
-        }
-    }
-};
 
 // Every fake tool first writes down the descriptors it was given (ls adds
 // its own 3, the directory it lists).
@@ -161,10 +149,10 @@ void Bounded(Tally *pTally) {
 
 TEST(ProofChildren, ChildHygiene) {
     PlaceTools();
-    Tally tally;
+    Tally tally{"child hygiene"};
     DescriptorsAndLeftovers(&tally);
     SigchldSettings(&tally);
     Bounded(&tally);
-    std::printf("child hygiene: %d tried, %d failed\n", tally.tried, tally.failed);
+    tally.Print();
     EXPECT_EQ(tally.failed, 0);
 }

@@ -18,6 +18,7 @@
 #include "sandbox/cupsd.h"
 #include "sandbox/snmpd.h"
 #include "support/paths.h"
+#include "support/proof_tally.h"
 #include "support/records.h"
 #include "support/written_files.h"
 #include "xavoprinter.h"
@@ -282,22 +283,19 @@ TEST(ProofInjection, NoSectionKeyOrLineOfOutsideTextInAnyFileTheLibraryWrites) {
     PlaceProgram("/usr/bin/bind_driver", "#!/bin/sh\nexit 0\n");
     const std::vector<NetPrinterInfo> mdnsInfo = BrowseAll(payloads.size());
 
-    int tried = 0, failed = 0;
+    Tally tally{"injection"};
     for (const Channel &channel : Channels(mdnsInfo)) {
         for (size_t i = 0; i < payloads.size(); ++i) {
             ClearWrittenFiles();
-            const Expected expected = channel.run(i, payloads[i].text);
-            const std::vector<std::string> found = Injections(expected);
-            ++tried;
+            const std::vector<std::string> found = Injections(channel.run(i, payloads[i].text));
             if (payloads[i].text == kPlain && channel.bShowsText) {
                 const std::string written = ReadFile(kConf) + ReadFile(kNptab) + ReadFile(kUsbtab);
                 EXPECT_NE(written.find(kPlain), std::string::npos) << channel.szName << " carried nothing";
             }
-            if (found.empty()) continue;
-            ++failed;
-            ADD_FAILURE() << channel.szName << " / " << payloads[i].szName << ": " << found.front();
+            tally.Check(found.empty(), std::string(channel.szName) + " / " + payloads[i].szName + ": " +
+                                           (found.empty() ? "" : found.front()));
         }
     }
-    std::printf("injection: %d tried, %d failed\n", tried, failed);
-    EXPECT_EQ(failed, 0);
+    tally.Print();
+    EXPECT_EQ(tally.failed, 0);
 }
