@@ -183,19 +183,6 @@ TEST(UsbPrinterPlugIn, RefusesBadArgumentsBeforeTheLockAndDevicesBeyondLp1After)
     }
 }
 
-TEST(UsbPrinterPlugIn, HostileDeviceTextsAddNoKeyNoSection) {
-    // A serial number with brackets and "=": one section; a device ID with line breaks: one value.
-    Plug("lp0", "1-1", "A]B=C[D", "MFG:X;\n[evil]\nmode = lpr\r\nMDL:Y;");
-    for (int plug = 0; plug < 2; ++plug) {
-        ASSERT_EQ(XAVOPrinterEnableExt(1, "lp0", "1-1"), 0);
-        const Section s = ReadSection(kConf, "04b8:0005:A]B=C[D");
-        EXPECT_EQ(s.size(), 4u);
-        EXPECT_EQ(s.at("mode"), "usbip");
-        EXPECT_EQ(s.at("product name"), "Y");
-        EXPECT_TRUE(ReadSection(kConf, "evil").empty());
-    }
-}
-
 // A section name is only text: a serial number that would make a path or a
 // file name pattern still registers the printer (only its kept PPD copy is
 // refused, by the queue creation).
