@@ -15,6 +15,7 @@
 #include "support/cases.h"
 #include "support/logs.h"
 #include "support/paths.h"
+#include "support/processes.h"
 #include "support/records.h"
 #include "xavoprinter.h"
 
@@ -116,9 +117,7 @@ TEST_F(CupsFaults, QueueListThatCannotBeReadFailsTheChecksButNotTheNameChoice) {
     XavoStandinReset();
     // A signal interrupts every read: three attempts, a pause after each,
     // and the caller's errno survives.
-    struct sigaction action {}, old {};
-    action.sa_handler = [](int) {};  // no SA_RESTART: the read returns EINTR
-    sigaction(SIGUSR1, &action, &old);
+    const InterruptingSignal interrupting(SIGUSR1);
     PlaceProgram("/usr/bin/lpstat", "#!/bin/sh\nsleep 0.2\nkill -USR1 " + std::to_string(getpid()) +
                                         "\nsleep 0.2\necho 'device for usbprinter1: usb:/dev/usb/" + kA + "'\n");
     errno = ENOTTY;
@@ -126,7 +125,6 @@ TEST_F(CupsFaults, QueueListThatCannotBeReadFailsTheChecksButNotTheNameChoice) {
     EXPECT_EQ(errno, ENOTTY);
     EXPECT_EQ(ORLICErrGet(), ERR_EXEC);
     EXPECT_EQ(TakeSleeps(), (std::vector<std::uint64_t>{1000000, 1000000, 1000000}));
-    sigaction(SIGUSR1, &old, nullptr);
 }
 
 // A listing line names the queue after its second blank, up to the first ':'.

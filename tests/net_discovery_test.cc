@@ -11,6 +11,7 @@
 
 #include "sandbox/sandbox.h"
 #include "support/logs.h"
+#include "support/processes.h"
 #include "xavoprinter.h"
 
 // The readers are internal to the library: compiled into this suite.
@@ -193,19 +194,15 @@ TEST(HostileOutput, LongLinesNulBytesAndFloodsStayInsideTheBuffers) {
 // ---- interrupted reads: a repeating SIGALRM without SA_RESTART ----
 class InterruptedReads : public ::testing::Test {
 protected:
-    void StartTimer(long usInterval) {
-        struct sigaction sa {};
-        sa.sa_handler = [](int) {};  // no SA_RESTART: reads return EINTR
-        sigaction(SIGALRM, &sa, &old_);
+    static void StartTimer(long usInterval) {
         itimerval timer{{0, usInterval}, {0, usInterval}};
         setitimer(ITIMER_REAL, &timer, nullptr);
     }
     void TearDown() override {
         itimerval off{};
         setitimer(ITIMER_REAL, &off, nullptr);
-        sigaction(SIGALRM, &old_, nullptr);
     }
-    struct sigaction old_ {};
+    InterruptingSignal alarm_{SIGALRM};
 };
 
 TEST_F(InterruptedReads, FewAreSurvivedTheTenthEndsTheCall) {

@@ -148,19 +148,6 @@ TEST_F(JobWaitListing, AnswersWhetherTheJobIsListed) {
     EXPECT_THAT(Logs(), ElementsAre(StartsWith("3 printer_cups_job_wait_complete:N open failed. [0x0900 ")));
 }
 
-// Catches SIGUSR1 without SA_RESTART, so that a read blocked when it
-// arrives fails with EINTR; the fake lpq sends it to the test (not to its
-// parent, which is the platform's helper that waits for it).
-struct InterruptibleReads {
-    InterruptibleReads() {
-        struct sigaction sa {};
-        sa.sa_handler = [](int) {};
-        sigaction(SIGUSR1, &sa, &old_);
-    }
-    ~InterruptibleReads() { sigaction(SIGUSR1, &old_, nullptr); }
-    struct sigaction old_ {};
-};
-
 // An lpq that prints a header, interrupts its reader (its first
 // iInterruptedRuns runs only; a few signals, so that one finds the reader
 // blocked however slowly it got there), then prints the rest.
@@ -176,7 +163,9 @@ void PlaceInterruptingLpq(int iInterruptedRuns) {
 }
 
 TEST_F(JobWaitListing, InterruptedListingIsTakenAgainAfterASecondAtMostThreeTimes) {
-    InterruptibleReads interruptible;
+    // The fake lpq sends SIGUSR1 to the test, not to its parent, which is
+    // the platform's helper that waits for it.
+    InterruptingSignal interruptible(SIGUSR1);
     PlaceInterruptingLpq(1);
     // Job 42 shows only in the interrupted listing, after the
     // interruption: the call must not have read past it.
