@@ -88,13 +88,10 @@ constexpr char kListingHeader[] = "usbprinter1 is not ready\n"
 constexpr char kListingJobs[] = "1st     root    123     report.pdf                      2048 bytes\n";
 constexpr char kListingEmpty[] = "usbprinter1 is ready\nno entries\n";
 
-// An lpq that prints the listing kept in /tmp/lpq.out and counts its runs.
+// An lpq that prints the listing and records its runs.
 void PlaceLpq(const std::string &listing) {
     PlaceFile("/tmp/lpq.out", listing);
-    PlaceProgram("/usr/bin/lpq", "#!/bin/sh\n"
-                                 "echo run >> /tmp/lpq.calls\n"
-                                 "for a in \"$@\"; do printf '%s\\n' \"$a\"; done > /tmp/lpq.argv\n"
-                                 "cat /tmp/lpq.out\n");
+    PlaceRecorder("/usr/bin/lpq", "lpq");
 }
 
 // A process the appliance takes for a running scheduler ("cupsd" is its
