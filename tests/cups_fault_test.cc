@@ -195,23 +195,37 @@ TEST_F(CupsFaults, SchedulerFileEditDropsExactlyTheUsbBlocks) {
     EXPECT_TRUE(Logs().empty());
 }
 
+// The kept PPD text by name.  The name is a base name under
+// "/etc/cups/ppd/": a "/" or a name whose path would not fit the 388-byte
+// buffer whole is a bad argument, never read.
 TEST_F(CupsFaults, KeptPpdTextAndItsErrorCodes) {
-    struct { const char *szName, *szContent, *szText; uint32_t uError; } const cases[] = {
+    std::string traversal = "../../../";
+    for (int i = 0; i < 177; ++i) traversal += "./";
+    traversal += "etc/passwd";  // 373 characters: the cut path loses ".ppd"
+    PlaceFile("/etc/cups/ppd/x/y.ppd", "NESTED");
+    struct { std::string name; const char *szContent, *szText; uint32_t uError; } const cases[] = {
         {"full", "*PPD-Adobe: \"4.3\"\n*End\n", "*PPD-Adobe: \"4.3\"\n*End\n", ERR_READ},
         {"open", "*PPD-Adobe: \"4.3\"\n*End", "*PPD-Adobe: \"4.3\"\n*End", 0},
         {"empty", "", nullptr, ERR_READ},
         {"missing", nullptr, nullptr, ERR_OPEN},
+        {traversal, nullptr, nullptr, ERR_BAD_PARAMETERS},
+        {"../ppd/full", nullptr, nullptr, ERR_BAD_PARAMETERS},
+        {"x/y", nullptr, nullptr, ERR_BAD_PARAMETERS},
+        {std::string(370, 'n'), nullptr, nullptr, ERR_BAD_PARAMETERS},  // 388 bytes with its NUL
+        {std::string(369, 'n'), nullptr, nullptr, ERR_OPEN},            // fits whole; no such file
     };
     for (const auto &c : cases) {
-        if (c.szContent) PlaceFile(std::string("/etc/cups/ppd/") + c.szName + ".ppd", c.szContent);
+        if (c.szContent) PlaceFile("/etc/cups/ppd/" + c.name + ".ppd", c.szContent);
         ORLICErrSetEx(0, "", 0);
-        char *szText = XAVOCupsGetPPD(c.szName);
-        EXPECT_EQ(szText == nullptr ? "(null)" : std::string(szText), c.szText ? c.szText : "(null)") << c.szName;
-        EXPECT_EQ(ORLICErrGet(), c.uError) << c.szName;
+        char *szText = XAVOCupsGetPPD(c.name.c_str());
+        EXPECT_EQ(szText == nullptr ? "(null)" : std::string(szText), c.szText ? c.szText : "(null)")
+            << c.name.substr(0, 20);
+        EXPECT_EQ(ORLICErrGet(), c.uError) << c.name.substr(0, 20);
         std::free(szText);
     }
     EXPECT_EQ(XAVOCupsGetPPD(nullptr), nullptr);
     EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
+    EXPECT_TRUE(Logs().empty());
 }
 
 namespace {
@@ -281,27 +295,4 @@ TEST_F(CupsFaults, KeptCopyIsNotLookedForUnderAnIdThatCannotNameOne) {
     PlaceFile("/etc/cups/ppd/04b8:0005:SN0001.ppd", "KEPT");
     EXPECT_EQ(XAVOPrinterCupsAdd(kA, nullptr), 0);
     EXPECT_THAT(Runs().front(), EndsWith(" -P /etc/cups/ppd/04b8:0005:SN0001.ppd"));
-}
-
-// The name is a base name under "/etc/cups/ppd/": a "/" or a name whose
-// path would not fit the 388-byte buffer whole is a bad argument.
-TEST_F(CupsFaults, KeptPpdTextIsNeverReadOutsideTheDirectoryOrFromACutPath) {
-    std::string traversal = "../../../";
-    for (int i = 0; i < 177; ++i) traversal += "./";
-    traversal += "etc/passwd";  // 373 characters: the cut path loses ".ppd"
-    PlaceFile("/etc/cups/ppd/x/y.ppd", "NESTED");
-    struct { std::string name; uint32_t uError; } const cases[] = {
-        {traversal, ERR_BAD_PARAMETERS},
-        {"../ppd/full", ERR_BAD_PARAMETERS},
-        {"x/y", ERR_BAD_PARAMETERS},
-        {std::string(370, 'n'), ERR_BAD_PARAMETERS},  // 388 bytes with its NUL
-        {std::string(369, 'n'), ERR_OPEN},            // fits whole; no such file
-    };
-    PlaceFile("/etc/cups/ppd/full.ppd", "FULL");
-    for (const auto &c : cases) {
-        ORLICErrSetEx(0, "", 0);
-        EXPECT_EQ(XAVOCupsGetPPD(c.name.c_str()), nullptr) << c.name.substr(0, 20);
-        EXPECT_EQ(ORLICErrGet(), c.uError) << c.name.substr(0, 20);
-    }
-    EXPECT_TRUE(Logs().empty());
 }
