@@ -57,6 +57,10 @@ template <size_t N>
 void Fill(char (&field)[N], const std::string &text) {
     std::snprintf(field, N, "%s", text.c_str());
 }
+template <class... Fields>
+void FillAll(const std::string &text, Fields &...fields) {
+    (Fill(fields, text), ...);
+}
 
 std::string Hex(const std::string &text) {
     std::string out = "0x";
@@ -100,16 +104,9 @@ const std::string kRecordId = "04b8:0005:REC";
 Expected SetUpUsbRecord(const std::string &id, const std::string &text) {
     UsbPrinterConf conf{};
     Fill(conf.szPrinterId, id);
-    for (auto field : {conf.szMode, conf.szProducer, conf.szDriverBrand, conf.szDriver}) {
-        std::snprintf(field, sizeof conf.szMode, "%s", text.c_str());
-    }
-    Fill(conf.szManualLockTimer, text);
-    Fill(conf.szAutoLockTimer, text);
-    Fill(conf.szProductName, text);
-    Fill(conf.szEnableAirprint, text);
-    Fill(conf.szEnableGoogleCloudPrint, text);
-    Fill(conf.szUsblpStringId, text);
-    Fill(conf.szFitToPage, text);
+    FillAll(text, conf.szMode, conf.szProducer, conf.szDriverBrand, conf.szDriver, conf.szManualLockTimer,
+            conf.szAutoLockTimer, conf.szProductName, conf.szEnableAirprint, conf.szEnableGoogleCloudPrint,
+            conf.szUsblpStringId, conf.szFitToPage);
     XAVOPrinterConfSetup(&conf, 1);
     return Expected::Usb(conf.szPrinterId);
 }
@@ -120,14 +117,9 @@ Expected SetUpNetRecord(const std::string &ip, const std::string &id, const std:
     NetPrinterConf conf = NetRecord();
     Fill(conf.szIP, ip);
     Fill(conf.szPrinterId, id);
-    for (auto field : {conf.szCupsPrinterName, conf.szBackend, conf.szQName, conf.szBrand, conf.szModel,
-                       conf.szDriverBrand, conf.szDriver}) {
-        std::snprintf(field, sizeof conf.szBackend, "%s", text.c_str());
-    }
-    Fill(conf.szEnableAirprint, text);
-    Fill(conf.szEnableGoogleCloudPrint, text);
-    Fill(conf.szStringId, text);
-    Fill(conf.szFitToPage, text);
+    FillAll(text, conf.szCupsPrinterName, conf.szBackend, conf.szQName, conf.szBrand, conf.szModel,
+            conf.szDriverBrand, conf.szDriver, conf.szEnableAirprint, conf.szEnableGoogleCloudPrint, conf.szStringId,
+            conf.szFitToPage);
     XAVOPrinterNetConfSetup(&conf, 1);
     XAVOPrinterNetUpdateConf(1, &conf);
     return Expected::Net(conf.szPrinterId, conf.szIP);
@@ -225,9 +217,7 @@ std::vector<Channel> Channels(const std::vector<NetPrinterInfo> &mdnsInfo) {
         {"network record address and ID", [](size_t, const std::string &p) { return SetUpNetRecord(p, p, kPlain); }},
         {"cloud print record", [](size_t, const std::string &p) {
              PrinterGoogleInfo info{};
-             Fill(info.szAccount, p);
-             Fill(info.szPassword, p);
-             Fill(info.szRefreshToken, p);
+             FillAll(p, info.szAccount, info.szPassword, info.szRefreshToken);
              XAVOPrinterGoogleInfoSet(&info);
              return Expected::Cloud();
          }, false},
