@@ -1,7 +1,6 @@
 // Proofs for the files the library keeps through the platform: many
 // processes writing at once lose nothing, and writers killed at any moment
 // leave each file whole and at most one temporary file behind.
-#include <dirent.h>
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -12,6 +11,7 @@
 #include <cstddef>
 #include <chrono>
 #include <cstring>
+#include <filesystem>
 #include <functional>
 #include <map>
 #include <random>
@@ -238,13 +238,11 @@ int Temps(const Target &t) {
     static const std::regex kSix("[A-Za-z0-9]{6}");
     const std::string prefix = t.szTempPrefix;
     int n = 0;
-    DIR *dir = opendir(t.szTempDir);
-    for (const dirent *e; dir != nullptr && (e = readdir(dir)) != nullptr;) {
-        const std::string name = e->d_name;
-        n += name.size() == prefix.size() + 6 && name.compare(0, prefix.size(), prefix) == 0 &&
-             std::regex_match(name.substr(prefix.size()), kSix);
+    std::error_code error;  // a missing directory holds none
+    for (const auto &entry : std::filesystem::directory_iterator(t.szTempDir, error)) {
+        const std::string name = entry.path().filename().string();
+        n += name.starts_with(prefix) && std::regex_match(name.substr(prefix.size()), kSix);
     }
-    if (dir != nullptr) closedir(dir);
     return n;
 }
 
