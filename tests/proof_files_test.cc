@@ -13,7 +13,6 @@
 #include <cstring>
 #include <filesystem>
 #include <functional>
-#include <map>
 #include <random>
 #include <regex>
 #include <string>
@@ -127,16 +126,6 @@ bool Lister() {
     return ok;
 }
 
-std::map<std::string, std::string> Pairs(const char *szPath) {
-    xavo::SzHash hash(ORLICSzHashAlloc(1024));
-    ORLICFileGetPair(szPath, hash.addr());
-    xavo::SzList keys(ORLICSzListAlloc(1024));
-    ORLICSzHashEnumKey(hash.get(), keys.addr());
-    std::map<std::string, std::string> out;
-    for (const std::string &key : Items(keys.get())) out[key] = ORLICSzHashGetValue(hash.get(), key.c_str());
-    return out;
-}
-
 TEST(FileProofs, ConcurrentWritersLoseNoKeyAndNoTableLine) {
     Tally tally{"concurrency"};
     RunAtOnce(kProcesses, [](int p) {
@@ -158,7 +147,7 @@ TEST(FileProofs, ConcurrentWritersLoseNoKeyAndNoTableLine) {
     EXPECT_TRUE(tally.Check(bCloud && std::string(cloud.szPassword) == "pw-v" + p + "-" + std::to_string(last)));
 
     RunAtOnce(kTableWriters + kListers, [](int w) { return w < kTableWriters ? TableWriter(w) : Lister(); });
-    const auto nptab = Pairs(kNptab), usbtab = Pairs(kUsbtab);
+    const auto nptab = ReadPairs(kNptab), usbtab = ReadPairs(kUsbtab);
     size_t kept = 0;
     for (int w = 0; w < kTableWriters; ++w) {
         for (int i = 0; i < kAdds; ++i) {
