@@ -10,30 +10,25 @@
 
 #include "support/fault_sweep.h"
 #include "support/logs.h"
-#include "support/processes.h"
+#include "support/paths.h"
+#include "support/records.h"
 #include "support/sections.h"
 #include "xavoprinter.h"
 
 using ::testing::ElementsAre;
 using ::testing::IsEmpty;
+using xavo::test::kConf;
 using xavo::test::Logs;
+using xavo::test::UsbRecord;
 
 namespace {
 
-constexpr char kConf[] = "/usr/xavo/etc/printer.conf";
 constexpr char kPrinter[] = "04b8:0005:SN0001";
 
 using xavo::test::Section;
 
 Section ReadSection(const char *szSection) { return xavo::test::ReadSection(kConf, szSection); }
 void WriteSection(const char *szSection, const Section &keys) { xavo::test::WriteSection(kConf, szSection, keys); }
-
-UsbPrinterConf Record(const char *szPrinterId) {
-    UsbPrinterConf conf;
-    std::memset(&conf, 0, sizeof conf);
-    std::strcpy(conf.szPrinterId, szPrinterId);
-    return conf;
-}
 
 // A stored section in which every key the record can carry has a value,
 // plus keys the record does not carry.
@@ -56,7 +51,7 @@ TEST(PrinterConfSetup, FilledFieldsReplaceAndEmptyOnesClearOnlyTheClearableKeysW
         for (int blWriteEmpty : {0, 1}) {
             xavo::test::ResetSandbox();
             if (!stored.empty()) WriteSection(kPrinter, stored);
-            UsbPrinterConf conf = Record(kPrinter);
+            UsbPrinterConf conf = UsbRecord(kPrinter);
             std::strcpy(conf.szProductName, "Model 100");
             std::strcpy(conf.szMode, "usbip");
             std::strcpy(conf.szDriver, "new.ppd");
@@ -84,7 +79,7 @@ TEST(PrinterConfLock, BusyLockIsTriedAHundredTimesAndTakenAtOnceWhenReleased) {
     xavo::test::TakeSleeps();
     EXPECT_EQ(XAVOPrinterPrinterConfLock(), -1);
     EXPECT_EQ(xavo::test::TakeSleeps(), std::vector<std::uint64_t>(100, 50000));
-    UsbPrinterConf conf = Record(kPrinter);
+    UsbPrinterConf conf = UsbRecord(kPrinter);
     std::strcpy(conf.szProducer, "New");
     EXPECT_EQ(XAVOPrinterConfSetup(&conf, 1), -1);
     EXPECT_EQ(ORLICErrGet(), ERR_LOCK);
@@ -129,38 +124,6 @@ TEST(PrinterCupsNameGet, BadArgumentsFailSilentlyWithBadParameters) {
     EXPECT_THAT(Logs(), IsEmpty());
 }
 
-// Several processes setting up printers at once: every key of every process
-// is in the file afterwards.  Each process owns some printers of its own and
-// one key of a printer they all share, so a setup that merged into a stale
-// copy of the shared section would drop another process's key.
-TEST(PrinterConfSetup, ConcurrentProcessesLoseNothing) {
-    constexpr int kProcesses = 8;
-    constexpr int kOwnPrinters = 4;
-    const char *sharedKeys[kProcesses] = {"producer", "product name", "mode", "driver",
-                                          "driver brand", "usblp string id", "fit to page", "enable airprint"};
-    xavo::test::RunAtOnce(kProcesses, [](int p) {
-        bool ok = true;
-        for (int i = 0; i < kOwnPrinters; ++i) {
-            UsbPrinterConf conf = Record(("p" + std::to_string(p) + "-" + std::to_string(i)).c_str());
-            std::snprintf(conf.szProducer, sizeof conf.szProducer, "maker %d", p);
-            ok &= XAVOPrinterConfSetup(&conf, 0) == 0;
-        }
-        UsbPrinterConf shared = Record("shared");
-        char *fields[kProcesses] = {shared.szProducer, shared.szProductName, shared.szMode,
-                                    shared.szDriver, shared.szDriverBrand, shared.szUsblpStringId,
-                                    shared.szFitToPage, shared.szEnableAirprint};
-        std::snprintf(fields[p], 8, "v%d", p);
-        return ok && XAVOPrinterConfSetup(&shared, 0) == 0;
-    });
-    for (int p = 0; p < kProcesses; ++p) {
-        for (int i = 0; i < kOwnPrinters; ++i) {
-            std::string id = "p" + std::to_string(p) + "-" + std::to_string(i);
-            EXPECT_EQ(ReadSection(id.c_str()), (Section{{"producer", "maker " + std::to_string(p)}})) << id;
-        }
-        EXPECT_EQ(ReadSection("shared")[sharedKeys[p]], "v" + std::to_string(p)) << sharedKeys[p];
-    }
-}
-
 // Every platform call of a setup failed in turn: the setup fails cleanly
 // (its own code or the platform's), or carries on where a failure is
 // harmless, and never leaves the printer lock held.
@@ -168,7 +131,7 @@ TEST(PrinterConfSetup, EachPlatformFailureFailsCleanly) {
     xavo::test::SweepFailures(
         [] { WriteSection(kPrinter, kStored); },
         [] {
-            UsbPrinterConf conf = Record(kPrinter);
+            UsbPrinterConf conf = UsbRecord(kPrinter);
             std::strcpy(conf.szProducer, "New");
             return XAVOPrinterConfSetup(&conf, 0);
         },

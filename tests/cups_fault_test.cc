@@ -14,6 +14,8 @@
 #include "sandbox/cupsd.h"
 #include "support/cases.h"
 #include "support/logs.h"
+#include "support/paths.h"
+#include "support/processes.h"
 #include "support/records.h"
 #include "xavoprinter.h"
 
@@ -30,7 +32,6 @@ using namespace xavo::test;
 namespace {
 
 constexpr char kA[] = "04b8:0005:SN0001";
-constexpr char kPrintersConf[] = "/etc/cups/printers.conf";
 // A program that appends its name and arguments to /tmp/runs.
 std::string Recorder(int iExit) {
     return "#!/bin/sh\necho \"${0##*/} $*\" >> /tmp/runs\nexit " + std::to_string(iExit) + "\n";
@@ -49,7 +50,7 @@ protected:
         ASSERT_GT(Cupsd::Pid(), 0);
         Cupsd::RemoveAllQueues();
         Tool({"/bin/sh", "-c", "rm -f /tmp/runs /usr/xavo/etc/printer.conf /etc/cups/ppd/*"});
-        PlaceFile("/usr/xavo/etc/nptab", "10.0.0.11=\"office\"\n");
+        PlaceFile(kNptab, "10.0.0.11=\"office\"\n");
         XavoStandinReset();
         ORLICErrSetEx(0, "", 0);
         Logs();
@@ -116,9 +117,7 @@ TEST_F(CupsFaults, QueueListThatCannotBeReadFailsTheChecksButNotTheNameChoice) {
     XavoStandinReset();
     // A signal interrupts every read: three attempts, a pause after each,
     // and the caller's errno survives.
-    struct sigaction action {}, old {};
-    action.sa_handler = [](int) {};  // no SA_RESTART: the read returns EINTR
-    sigaction(SIGUSR1, &action, &old);
+    const InterruptingSignal interrupting(SIGUSR1);
     PlaceProgram("/usr/bin/lpstat", "#!/bin/sh\nsleep 0.2\nkill -USR1 " + std::to_string(getpid()) +
                                         "\nsleep 0.2\necho 'device for usbprinter1: usb:/dev/usb/" + kA + "'\n");
     errno = ENOTTY;
@@ -126,7 +125,6 @@ TEST_F(CupsFaults, QueueListThatCannotBeReadFailsTheChecksButNotTheNameChoice) {
     EXPECT_EQ(errno, ENOTTY);
     EXPECT_EQ(ORLICErrGet(), ERR_EXEC);
     EXPECT_EQ(TakeSleeps(), (std::vector<std::uint64_t>{1000000, 1000000, 1000000}));
-    sigaction(SIGUSR1, &old, nullptr);
 }
 
 // A listing line names the queue after its second blank, up to the first ':'.
@@ -182,38 +180,52 @@ TEST_F(CupsFaults, SchedulerFileEditDropsExactlyTheUsbBlocks) {
         {std::string(1500, 'x') + "\n<Printer usbprinter>\n</Printer>\n", std::string(1500, 'x') + "\n"},
     };
     for (const auto &c : cases) {
-        PlaceFile(kPrintersConf, c.before, 0640);
+        PlaceFile(kCupsConf, c.before, 0640);
         EXPECT_EQ(XAVOPrinterCupsUsbConfRmAll(), 0);
-        EXPECT_EQ(ReadFile(kPrintersConf), c.after);
+        EXPECT_EQ(ReadFile(kCupsConf), c.after);
     }
-    PlaceFile(kPrintersConf, head);
+    PlaceFile(kCupsConf, head);
     XavoStandinFailCall("ORLICFileTempFileOpen", 1, ERR_OPEN);
     EXPECT_EQ(XAVOPrinterCupsUsbConfRmAll(), -1);
     EXPECT_EQ(ORLICErrGet(), ERR_OPEN);
-    EXPECT_EQ(ReadFile(kPrintersConf), head);
-    unlink(kPrintersConf);
+    EXPECT_EQ(ReadFile(kCupsConf), head);
+    unlink(kCupsConf);
     EXPECT_EQ(XAVOPrinterCupsUsbConfRmAll(), 0);
-    EXPECT_FALSE(FileExists(kPrintersConf));
+    EXPECT_FALSE(FileExists(kCupsConf));
     EXPECT_TRUE(Logs().empty());
 }
 
+// The kept PPD text by name.  The name is a base name under
+// "/etc/cups/ppd/": a "/" or a name whose path would not fit the 388-byte
+// buffer whole is a bad argument, never read.
 TEST_F(CupsFaults, KeptPpdTextAndItsErrorCodes) {
-    struct { const char *szName, *szContent, *szText; uint32_t uError; } const cases[] = {
+    std::string traversal = "../../../";
+    for (int i = 0; i < 177; ++i) traversal += "./";
+    traversal += "etc/passwd";  // 373 characters: the cut path loses ".ppd"
+    PlaceFile("/etc/cups/ppd/x/y.ppd", "NESTED");
+    struct { std::string name; const char *szContent, *szText; uint32_t uError; } const cases[] = {
         {"full", "*PPD-Adobe: \"4.3\"\n*End\n", "*PPD-Adobe: \"4.3\"\n*End\n", ERR_READ},
         {"open", "*PPD-Adobe: \"4.3\"\n*End", "*PPD-Adobe: \"4.3\"\n*End", 0},
         {"empty", "", nullptr, ERR_READ},
         {"missing", nullptr, nullptr, ERR_OPEN},
+        {traversal, nullptr, nullptr, ERR_BAD_PARAMETERS},
+        {"../ppd/full", nullptr, nullptr, ERR_BAD_PARAMETERS},
+        {"x/y", nullptr, nullptr, ERR_BAD_PARAMETERS},
+        {std::string(370, 'n'), nullptr, nullptr, ERR_BAD_PARAMETERS},  // 388 bytes with its NUL
+        {std::string(369, 'n'), nullptr, nullptr, ERR_OPEN},            // fits whole; no such file
     };
     for (const auto &c : cases) {
-        if (c.szContent) PlaceFile(std::string("/etc/cups/ppd/") + c.szName + ".ppd", c.szContent);
+        if (c.szContent) PlaceFile("/etc/cups/ppd/" + c.name + ".ppd", c.szContent);
         ORLICErrSetEx(0, "", 0);
-        char *szText = XAVOCupsGetPPD(c.szName);
-        EXPECT_EQ(szText == nullptr ? "(null)" : std::string(szText), c.szText ? c.szText : "(null)") << c.szName;
-        EXPECT_EQ(ORLICErrGet(), c.uError) << c.szName;
+        char *szText = XAVOCupsGetPPD(c.name.c_str());
+        EXPECT_EQ(szText == nullptr ? "(null)" : std::string(szText), c.szText ? c.szText : "(null)")
+            << c.name.substr(0, 20);
+        EXPECT_EQ(ORLICErrGet(), c.uError) << c.name.substr(0, 20);
         std::free(szText);
     }
     EXPECT_EQ(XAVOCupsGetPPD(nullptr), nullptr);
     EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
+    EXPECT_TRUE(Logs().empty());
 }
 
 namespace {
@@ -283,27 +295,4 @@ TEST_F(CupsFaults, KeptCopyIsNotLookedForUnderAnIdThatCannotNameOne) {
     PlaceFile("/etc/cups/ppd/04b8:0005:SN0001.ppd", "KEPT");
     EXPECT_EQ(XAVOPrinterCupsAdd(kA, nullptr), 0);
     EXPECT_THAT(Runs().front(), EndsWith(" -P /etc/cups/ppd/04b8:0005:SN0001.ppd"));
-}
-
-// The name is a base name under "/etc/cups/ppd/": a "/" or a name whose
-// path would not fit the 388-byte buffer whole is a bad argument.
-TEST_F(CupsFaults, KeptPpdTextIsNeverReadOutsideTheDirectoryOrFromACutPath) {
-    std::string traversal = "../../../";
-    for (int i = 0; i < 177; ++i) traversal += "./";
-    traversal += "etc/passwd";  // 373 characters: the cut path loses ".ppd"
-    PlaceFile("/etc/cups/ppd/x/y.ppd", "NESTED");
-    struct { std::string name; uint32_t uError; } const cases[] = {
-        {traversal, ERR_BAD_PARAMETERS},
-        {"../ppd/full", ERR_BAD_PARAMETERS},
-        {"x/y", ERR_BAD_PARAMETERS},
-        {std::string(370, 'n'), ERR_BAD_PARAMETERS},  // 388 bytes with its NUL
-        {std::string(369, 'n'), ERR_OPEN},            // fits whole; no such file
-    };
-    PlaceFile("/etc/cups/ppd/full.ppd", "FULL");
-    for (const auto &c : cases) {
-        ORLICErrSetEx(0, "", 0);
-        EXPECT_EQ(XAVOCupsGetPPD(c.name.c_str()), nullptr) << c.name.substr(0, 20);
-        EXPECT_EQ(ORLICErrGet(), c.uError) << c.name.substr(0, 20);
-    }
-    EXPECT_TRUE(Logs().empty());
 }

@@ -9,10 +9,12 @@
 #include <vector>
 
 #include "support/logs.h"
+#include "support/paths.h"
 #include "support/sections.h"
 #include "xavoprinter.h"
 
 using ::testing::IsEmpty;
+using xavo::test::kConf;
 using xavo::test::Logs;
 
 namespace {
@@ -91,8 +93,6 @@ TEST(DeviceIdGetters, TakeTheFirstOfTheirKeysFound) {
         EXPECT_EQ(Logs().size(), keys.size());
     }
 }
-
-constexpr char kConf[] = "/usr/xavo/etc/printer.conf";
 
 void StoreStringId(const char *szPrinterId, const char *szStringId) {
     xavo::test::WriteSection(kConf, szPrinterId, {{"usblp string id", szStringId}});

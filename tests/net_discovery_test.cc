@@ -1,21 +1,17 @@
 // Network identification: the one-line readers of each tool's output from
-// tables of lines the real tools printed, then the operations against the
-// real ping, snmpd and avahi-daemon of the sandbox's loopback network and
-// against fake tools for what no real peer prints (hostile output,
-// interrupted reads).
+// tables of lines the real tools printed, then the operations against fake
+// tools for what no real peer prints (hostile output, interrupted reads).
+// The real peers are net_peers_test's.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <cerrno>
 #include <cstring>
-#include <future>
-#include <memory>
 #include <string>
 
-#include "sandbox/avahi.h"
 #include "sandbox/sandbox.h"
 #include "support/logs.h"
-#include "sandbox/snmpd.h"
+#include "support/processes.h"
 #include "xavoprinter.h"
 
 // The readers are internal to the library: compiled into this suite.
@@ -24,24 +20,11 @@
 #include "net/ping_lines.cc"
 #include "net/snmp_lines.cc"
 
-using ::testing::AllOf;
 using ::testing::ElementsAre;
-using ::testing::HasSubstr;
-using ::testing::Not;
-using ::testing::IsEmpty;
 using namespace xavo;
 using namespace xavo::test;
 
 namespace {
-
-// The library's own lines: daemons started in the sandbox log there too.
-std::vector<std::string> LibraryLogs() {
-    std::vector<std::string> out;
-    for (const std::string &line : Logs()) {
-        if (line.find(" printer_net_") != std::string::npos) out.push_back(line);
-    }
-    return out;
-}
 
 // ---- snmpwalk lines (recorded from snmpwalk 5.9.3 against snmpd) ----
 struct SnmpIdCase { const char *szLine; SnmpIdKind kind; const char *szValue; };
@@ -162,20 +145,11 @@ TEST(BjnpDiscovery, ListingLinesDecideTheAnswerAndTheRetries) {
         if (c.result == -1) { EXPECT_EQ(ORLICErrGet(), ERR_EXEC) << c.szName; }
         EXPECT_STREQ(info.szBackend, "") << c.szName;
         EXPECT_EQ(TakeSleeps(), c.sleeps) << c.szName;
-        EXPECT_EQ(LibraryLogs().size(), c.logs) << c.szName;
+        EXPECT_EQ(UnitLogs("printer_net_").size(), c.logs) << c.szName;
     }
 }
 
 constexpr char kPing[] = "/bin/ping";
-
-TEST(PingStatus, RealPingOnLoopbackAndWithoutRoute) {
-    char szStatus[16];
-    EXPECT_EQ(XAVOPrinterNetPingStatus("127.0.0.1", szStatus, 4), 0);
-    EXPECT_STREQ(szStatus, "Onl") << "cut to the caller's size";
-    // No interface but lo in the sandbox: no route, nothing is sent.
-    EXPECT_EQ(XAVOPrinterNetPingStatus("10.255.255.1", szStatus, sizeof szStatus), 0);
-    EXPECT_STREQ(szStatus, "Offline");
-}
 
 // Where no daemon of the suite runs, the library starts the appliance's
 // one, which would detach out of the test's reach: a stub stands in.
@@ -214,101 +188,21 @@ TEST(HostileOutput, LongLinesNulBytesAndFloodsStayInsideTheBuffers) {
     NetPrinterInfo info{};
     Logs();
     EXPECT_EQ(XAVOPrinterNetAvahiInfoGet("10.0.0.1", &info), -1) << "no browser: cannot start";
-    EXPECT_THAT(LibraryLogs(), ::testing::SizeIs(1));
-}
-
-// ---- mDNS against the real avahi-daemon ----
-// Three printers on loopback.  127.0.0.11 begins with 127.0.0.1 and
-// announces the most preferred service: asking for 127.0.0.1 must not
-// take it.  127.0.0.3 offers a web page and an LPD queue without TXT
-// strings, whose resolved line ends in an empty field.
-class AvahiDiscovery : public ::testing::Test {
-protected:
-    static void SetUpTestSuite() {
-        avahi_ = new AvahiResponder({
-            {"laser", "127.0.0.1", "Office Laser",
-             {{"_ipp._tcp", 631, {"usb_MDL=Laser 100"}},
-              {"_pdl-datastream._tcp", 9100, {"usb_CMD=PCL,PJL", "usb_MDL=Laser 100", "usb_MFG=ACME"}}}},
-            {"inkjet", "127.0.0.11", "Lab Inkjet",
-             {{"_printer._tcp", 515, {"usb_MFG=Canon", "usb_MDL=iX 6800"}},
-              {"_canon-bjnp1._tcp", 8611, {"usb_CMD=BJL,BJRaster3", "usb_MFG=Canon"}}}},
-            {"nas", "127.0.0.3", "Storage Box",
-             {{"_http._tcp", 80, {"usb_MFG=Other", "usb_MDL=Web"}}, {"_printer._tcp", 515, {}}}},
-        });
-    }
-    static void TearDownTestSuite() {
-        delete avahi_;
-        avahi_ = nullptr;
-    }
-    static AvahiResponder *avahi_;
-};
-AvahiResponder *AvahiDiscovery::avahi_ = nullptr;
-XAVO_SANDBOX_PER_SUITE(AvahiDiscovery);
-
-// The lookups run at the same time, as the appliance's processes may run
-// them: each browse takes the daemon's second whatever it finds.
-TEST_F(AvahiDiscovery, PreferredServiceOfTheWholeAddressCompletesTheRecord) {
-    ASSERT_TRUE(avahi_->ready()) << AvahiResponder::DaemonLog();
-    struct Case {
-        const char *szName, *szIP, *szGivenId;
-        int32_t result;
-        const char *szBackend, *szBrand, *szModel, *szStringId;
-    };
-    const Case cases[] = {
-        {"socket before ipp, not the longer address's bjnp", "127.0.0.1", "", 0, "socket", "ACME", "Laser 100",
-         "MFG:ACME;CMD:PCL,PJL;MDL:Laser 100;CLS:PRINTER;DES:ACME Laser 100;"},
-        {"a device ID already there is kept", "127.0.0.1", "MFG:Snmp;MDL:Given;", 0, "socket", "ACME",
-         "Laser 100", "MFG:Snmp;MDL:Given;"},
-        {"bjnp before lpd; no model in its TXT", "127.0.0.11", "", 0, "bjnp", "Not Found", "Not Found",
-         "MFG:Not Found;CMD:BJL,BJRaster3;MDL:Not Found;CLS:PRINTER;DES:Not Found Not Found;"},
-        {"a web page and an empty TXT are no service", "127.0.0.3", "", 1, "", "", "", ""},
-    };
-    struct Outcome { int32_t result; int savedErrno; NetPrinterInfo info; };
-    std::vector<std::future<Outcome>> outcomes;
-    for (const Case &c : cases) {
-        outcomes.push_back(std::async(std::launch::async, [&c] {
-            Outcome out{};
-            std::strcpy(out.info.szQName, "queue");
-            std::strcpy(out.info.szStringId, c.szGivenId);
-            errno = EDOM;
-            out.result = XAVOPrinterNetAvahiInfoGet(c.szIP, &out.info);
-            out.savedErrno = errno;
-            return out;
-        }));
-    }
-    for (size_t i = 0; i < std::size(cases); ++i) {
-        const Case &c = cases[i];
-        Outcome out = outcomes[i].get();
-        EXPECT_EQ(out.result, c.result) << c.szName;
-        EXPECT_EQ(out.savedErrno, EDOM) << c.szName;
-        EXPECT_STREQ(out.info.szBackend, c.szBackend) << c.szName;
-        EXPECT_STREQ(out.info.szBrand, c.szBrand) << c.szName;
-        EXPECT_STREQ(out.info.szModel, c.szModel) << c.szName;
-        EXPECT_STREQ(out.info.szStringId, c.szStringId) << c.szName;
-        EXPECT_STREQ(out.info.szQName, "queue") << c.szName;
-        EXPECT_STREQ(out.info.szIP, "") << c.szName;
-    }
-    EXPECT_THAT(LibraryLogs(),
-                ElementsAre(AllOf(HasSubstr("printer_net_avahi_info_get:N Failed to make printer string ID. Info: "),
-                                  HasSubstr("\"usb_CMD=BJL,BJRaster3\""), Not(HasSubstr("iX 6800")))));
+    EXPECT_THAT(UnitLogs("printer_net_"), ::testing::SizeIs(1));
 }
 
 // ---- interrupted reads: a repeating SIGALRM without SA_RESTART ----
 class InterruptedReads : public ::testing::Test {
 protected:
-    void StartTimer(long usInterval) {
-        struct sigaction sa {};
-        sa.sa_handler = [](int) {};  // no SA_RESTART: reads return EINTR
-        sigaction(SIGALRM, &sa, &old_);
+    static void StartTimer(long usInterval) {
         itimerval timer{{0, usInterval}, {0, usInterval}};
         setitimer(ITIMER_REAL, &timer, nullptr);
     }
     void TearDown() override {
         itimerval off{};
         setitimer(ITIMER_REAL, &off, nullptr);
-        sigaction(SIGALRM, &old_, nullptr);
     }
-    struct sigaction old_ {};
+    InterruptingSignal alarm_{SIGALRM};
 };
 
 TEST_F(InterruptedReads, FewAreSurvivedTheTenthEndsTheCall) {
@@ -335,69 +229,7 @@ TEST_F(InterruptedReads, FewAreSurvivedTheTenthEndsTheCall) {
     NetPrinterInfo info{};
     EXPECT_EQ(XAVOPrinterNetBjnpInfoGet("10.0.0.1", &info), -1) << "each listing is spoilt by a signal";
     EXPECT_THAT(TakeSleeps(), ElementsAre(1000000u, 1000000u, 1000000u));
-    LibraryLogs();
-}
-
-// ---- SNMP against the real snmpd ----
-const std::string kDeviceId = "MFG:ACME;CMD:PCL,PJL;MDL:LaserJet 100;CLS:PRINTER;DES:ACME LaserJet 100;";
-
-class SnmpProbe : public ::testing::Test {
-protected:
-    void SetUp() override {
-        if (agents_) return;
-        PlaceSnmpClientConfig();
-        agents_ = new std::vector<std::unique_ptr<SnmpAgent>>;
-        agents_->push_back(std::make_unique<SnmpAgent>(
-            "127.0.0.1", std::vector<SnmpValue>{{".1.1.0", "integer", "7"},
-                                                {".1.2.0", "octet_str", kDeviceId},
-                                                {".1.3.0", "octet_str", "LPR://127.0.0.1/lp1"},
-                                                {".1.4.0", "octet_str", "plain text"}}));
-        using Values = std::vector<SnmpValue>;
-        agents_->push_back(std::make_unique<SnmpAgent>("127.0.0.2", Values{{".1.2.0", "octet_str", kDeviceId}}));
-        agents_->push_back(
-            std::make_unique<SnmpAgent>("127.0.0.3", Values{{".1.3.0", "octet_str", "socket://127.0.0.3:9100"}}));
-    }
-    static void TearDownTestSuite() {
-        delete agents_;
-        agents_ = nullptr;
-    }
-    static std::vector<std::unique_ptr<SnmpAgent>> *agents_;
-};
-std::vector<std::unique_ptr<SnmpAgent>> *SnmpProbe::agents_ = nullptr;
-XAVO_SANDBOX_PER_SUITE(SnmpProbe);
-
-TEST_F(SnmpProbe, AnswersOfRealAgents) {
-    for (auto &agent : *agents_) ASSERT_TRUE(agent->running());
-    NetPrinterInfo info;
-    std::memset(&info, 'x', sizeof info);
-    EXPECT_EQ(XAVOPrinterNetInfoGetByIP("127.0.0.1", &info), 0);
-    EXPECT_STREQ(info.szIP, "");
-    EXPECT_STREQ(info.szBackend, "lpd");
-    EXPECT_STREQ(info.szQName, "lp1");
-    EXPECT_EQ(std::string(info.szStringId), kDeviceId);
-    EXPECT_STREQ(info.szBrand, "ACME");
-    EXPECT_STREQ(info.szModel, "LaserJet 100");
-
-    EXPECT_EQ(XAVOPrinterNetInfoGetByIP("127.0.0.2", &info), 1) << "device ID without URI";
-    EXPECT_STREQ(info.szBackend, "");
-    EXPECT_STREQ(info.szModel, "LaserJet 100");
-
-    EXPECT_EQ(XAVOPrinterNetInfoGetByIP("127.0.0.3", &info), -1) << "URI without device ID";
-    EXPECT_STREQ(info.szBackend, "socket");
-    EXPECT_STREQ(info.szQName, "");
-    EXPECT_THAT(Logs(), ::testing::Contains(::testing::HasSubstr("Failed to get network printer string ID.")));
-
-    EXPECT_EQ(XAVOPrinterNetInfoGetByIP("127.0.0.4", &info), 1) << "no agent: the tool's own time-out";
-    EXPECT_THAT(Logs(), IsEmpty());
-}
-
-TEST_F(SnmpProbe, DeviceIdAtTheBufferBound) {
-    std::string buf(kDeviceId.size() + 1, 'x');
-    EXPECT_EQ(XAVOPrinterNetGetStringId("127.0.0.2", buf.data(), static_cast<int32_t>(kDeviceId.size() + 1)), 0);
-    EXPECT_EQ(std::string(buf.c_str()), kDeviceId);
-    EXPECT_EQ(XAVOPrinterNetGetStringId("127.0.0.2", buf.data(), static_cast<int32_t>(kDeviceId.size())), -1);
-    EXPECT_EQ(ORLICErrGet(), ERR_BAD_DATA);
-    EXPECT_STREQ(buf.c_str(), "");
+    UnitLogs("printer_net_");
 }
 
 // Both lookups over the same fake walk output.
@@ -422,7 +254,7 @@ TEST(SnmpToolOutput, ThreeWayAnswersOfBothLookups) {
         EXPECT_STREQ(szBackend, c.szBackend) << c.szName;
         if (c.idResult != 0) { EXPECT_STREQ(szId, "") << c.szName; }
     }
-    LibraryLogs();
+    UnitLogs("printer_net_");
 }
 
 }  // namespace

@@ -15,6 +15,7 @@
 #include "support/cases.h"
 #include "support/fault_sweep.h"
 #include "support/logs.h"
+#include "support/paths.h"
 #include "support/processes.h"
 #include "xavoprinter.h"
 
@@ -29,7 +30,6 @@ using namespace xavo::test;
 
 namespace {
 
-constexpr char kConf[] = "/usr/xavo/etc/printer.conf";
 constexpr char kPrinter[] = "04b8:0005:SN0001";
 constexpr char kQueue[] = "usbprinter1";
 constexpr char kSpool[] = "/var/services/printer";
@@ -88,13 +88,10 @@ constexpr char kListingHeader[] = "usbprinter1 is not ready\n"
 constexpr char kListingJobs[] = "1st     root    123     report.pdf                      2048 bytes\n";
 constexpr char kListingEmpty[] = "usbprinter1 is ready\nno entries\n";
 
-// An lpq that prints the listing kept in /tmp/lpq.out and counts its runs.
+// An lpq that prints the listing and records its runs.
 void PlaceLpq(const std::string &listing) {
     PlaceFile("/tmp/lpq.out", listing);
-    PlaceProgram("/usr/bin/lpq", "#!/bin/sh\n"
-                                 "echo run >> /tmp/lpq.calls\n"
-                                 "for a in \"$@\"; do printf '%s\\n' \"$a\"; done > /tmp/lpq.argv\n"
-                                 "cat /tmp/lpq.out\n");
+    PlaceRecorder("/usr/bin/lpq", "lpq");
 }
 
 // A process the appliance takes for a running scheduler ("cupsd" is its
@@ -148,19 +145,6 @@ TEST_F(JobWaitListing, AnswersWhetherTheJobIsListed) {
     EXPECT_THAT(Logs(), ElementsAre(StartsWith("3 printer_cups_job_wait_complete:N open failed. [0x0900 ")));
 }
 
-// Catches SIGUSR1 without SA_RESTART, so that a read blocked when it
-// arrives fails with EINTR; the fake lpq sends it to the test (not to its
-// parent, which is the platform's helper that waits for it).
-struct InterruptibleReads {
-    InterruptibleReads() {
-        struct sigaction sa {};
-        sa.sa_handler = [](int) {};
-        sigaction(SIGUSR1, &sa, &old_);
-    }
-    ~InterruptibleReads() { sigaction(SIGUSR1, &old_, nullptr); }
-    struct sigaction old_ {};
-};
-
 // An lpq that prints a header, interrupts its reader (its first
 // iInterruptedRuns runs only; a few signals, so that one finds the reader
 // blocked however slowly it got there), then prints the rest.
@@ -176,7 +160,9 @@ void PlaceInterruptingLpq(int iInterruptedRuns) {
 }
 
 TEST_F(JobWaitListing, InterruptedListingIsTakenAgainAfterASecondAtMostThreeTimes) {
-    InterruptibleReads interruptible;
+    // The fake lpq sends SIGUSR1 to the test, not to its parent, which is
+    // the platform's helper that waits for it.
+    InterruptingSignal interruptible(SIGUSR1);
     PlaceInterruptingLpq(1);
     // Job 42 shows only in the interrupted listing, after the
     // interruption: the call must not have read past it.
@@ -274,12 +260,7 @@ XAVO_SANDBOX_PER_SUITE(RealCups);
 class RealCups : public ::testing::Test {
 protected:
     void SetUp() override { Cupsd::Start(); Cupsd::RemoveAllQueues(); }
-    static void TearDownTestSuite() {
-        // The scheduler is our child: reaped here by its id once stopped.
-        pid_t pid = Cupsd::Pid();
-        Cupsd::Stop();
-        if (pid > 0) waitpid(pid, nullptr, 0);
-    }
+    static void TearDownTestSuite() { Cupsd::Stop(); }
 
     // A USB-style queue that holds its jobs: disabled, nothing behind it.
     static std::string StalledQueue() {

@@ -14,6 +14,7 @@
 #include <vector>
 
 #include "sandbox/sandbox.h"
+#include "support/paths.h"
 #include "support/proof_tally.h"
 #include "support/records.h"
 #include "support/sections.h"
@@ -23,7 +24,6 @@ using namespace xavo::test;
 
 namespace {
 
-constexpr char kConf[] = "/usr/xavo/etc/printer.conf";
 constexpr char kSection[] = "Google Cloud Print";
 constexpr char kCanaryPassword[] = "Canary-Pw-7f3a9c01";
 constexpr char kCanaryToken[] = "1//Canary-Token-51d2e8aa";

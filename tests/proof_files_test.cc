@@ -1,7 +1,6 @@
 // Proofs for the files the library keeps through the platform: many
 // processes writing at once lose nothing, and writers killed at any moment
 // leave each file whole and at most one temporary file behind.
-#include <dirent.h>
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -12,8 +11,8 @@
 #include <cstddef>
 #include <chrono>
 #include <cstring>
+#include <filesystem>
 #include <functional>
-#include <map>
 #include <random>
 #include <regex>
 #include <string>
@@ -21,6 +20,7 @@
 #include <vector>
 
 #include "internal/guards.h"
+#include "support/paths.h"
 #include "support/processes.h"
 #include "support/proof_tally.h"
 #include "support/records.h"
@@ -31,11 +31,6 @@ using namespace xavo::test;
 
 namespace {
 
-constexpr char kConf[] = "/usr/xavo/etc/printer.conf";
-constexpr char kNptab[] = "/usr/xavo/etc/nptab";
-constexpr char kUsbtab[] = "/tmp/usbtab";
-constexpr char kSmbConf[] = "/etc/samba/smb.reserved.conf";
-constexpr char kCupsConf[] = "/etc/cups/printers.conf";
 constexpr char kKvFmt[] = "%s=\"%s\"\n";
 constexpr char kSectionFmt[] = "\t%s = %s\n";
 
@@ -131,16 +126,6 @@ bool Lister() {
     return ok;
 }
 
-std::map<std::string, std::string> Pairs(const char *szPath) {
-    xavo::SzHash hash(ORLICSzHashAlloc(1024));
-    ORLICFileGetPair(szPath, hash.addr());
-    xavo::SzList keys(ORLICSzListAlloc(1024));
-    ORLICSzHashEnumKey(hash.get(), keys.addr());
-    std::map<std::string, std::string> out;
-    for (const std::string &key : Items(keys.get())) out[key] = ORLICSzHashGetValue(hash.get(), key.c_str());
-    return out;
-}
-
 TEST(FileProofs, ConcurrentWritersLoseNoKeyAndNoTableLine) {
     Tally tally{"concurrency"};
     RunAtOnce(kProcesses, [](int p) {
@@ -162,7 +147,7 @@ TEST(FileProofs, ConcurrentWritersLoseNoKeyAndNoTableLine) {
     EXPECT_TRUE(tally.Check(bCloud && std::string(cloud.szPassword) == "pw-v" + p + "-" + std::to_string(last)));
 
     RunAtOnce(kTableWriters + kListers, [](int w) { return w < kTableWriters ? TableWriter(w) : Lister(); });
-    const auto nptab = Pairs(kNptab), usbtab = Pairs(kUsbtab);
+    const auto nptab = ReadPairs(kNptab), usbtab = ReadPairs(kUsbtab);
     size_t kept = 0;
     for (int w = 0; w < kTableWriters; ++w) {
         for (int i = 0; i < kAdds; ++i) {
@@ -242,13 +227,11 @@ int Temps(const Target &t) {
     static const std::regex kSix("[A-Za-z0-9]{6}");
     const std::string prefix = t.szTempPrefix;
     int n = 0;
-    DIR *dir = opendir(t.szTempDir);
-    for (const dirent *e; dir != nullptr && (e = readdir(dir)) != nullptr;) {
-        const std::string name = e->d_name;
-        n += name.size() == prefix.size() + 6 && name.compare(0, prefix.size(), prefix) == 0 &&
-             std::regex_match(name.substr(prefix.size()), kSix);
+    std::error_code error;  // a missing directory holds none
+    for (const auto &entry : std::filesystem::directory_iterator(t.szTempDir, error)) {
+        const std::string name = entry.path().filename().string();
+        n += name.starts_with(prefix) && std::regex_match(name.substr(prefix.size()), kSix);
     }
-    if (dir != nullptr) closedir(dir);
     return n;
 }
 

@@ -1,8 +1,6 @@
 // Proofs of what the library's files keep from other users: a symlink
-// planted at any path it writes never gets its target written, a table that
-// another user planted in /tmp is neither believed nor kept, and the cloud
-// secrets are never in clear where others can see them, nor opened when
-// damaged.
+// planted at any path it writes never gets its target written, and a table
+// that another user planted in /tmp is neither believed nor kept.
 #include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -19,6 +17,7 @@
 #include <vector>
 
 #include "support/cases.h"
+#include "support/paths.h"
 #include "support/proof_tally.h"
 #include "support/records.h"
 #include "support/sections.h"
@@ -28,12 +27,7 @@ using namespace xavo::test;
 
 namespace {
 
-constexpr char kConf[] = "/usr/xavo/etc/printer.conf";
-constexpr char kNptab[] = "/usr/xavo/etc/nptab";
-constexpr char kUsbtab[] = "/tmp/usbtab";
 constexpr char kUsbtabLock[] = "/tmp/.usbtab.lock";
-constexpr char kSmbConf[] = "/etc/samba/smb.reserved.conf";
-constexpr char kCupsConf[] = "/etc/cups/printers.conf";
 constexpr char kPrinter[] = "04b8:0005:SN0001";
 constexpr char kVictim[] = "/root/victim";
 constexpr char kTmpVictim[] = "/tmp/roots-file";  // on /tmp's file system
@@ -51,13 +45,28 @@ void PlugPrinter() {
     SetUsblp("lp0", {.deviceIdReply = UsblpReply("MFG:ACME;MDL:Model 100;")});
 }
 
-UsbPrinterConf UsbSetupRecord() {
+// The writes of each file, as the appliance's services make them.
+void SetUpUsb() {
     UsbPrinterConf conf = UsbRecord(kPrinter);
     std::strcpy(conf.szDriver, "drv.ppd");
-    return conf;
+    XAVOPrinterConfSetup(&conf, 0);
 }
-
-PrinterGoogleInfo Cloud(const char *szPassword) { return CloudRecord("owner@example.com", szPassword, ""); }
+void SetUpNet() {
+    const NetPrinterConf net = NetRecord();
+    XAVOPrinterNetConfSetup(&net, 0);
+}
+void AddNet() {
+    const NetPrinterConf net = NetRecord();
+    XAVOPrinterNetUpdateConf(1, &net);
+}
+void SetCloud() {
+    const PrinterGoogleInfo cloud = CloudRecord("owner@example.com", "pw", "");
+    XAVOPrinterGoogleInfoSet(&cloud);
+}
+void PlugIn() {
+    PlugPrinter();
+    XAVOPrinterEnableExt(1, "lp0", "1-1");
+}
 
 // ---- symlinks -------------------------------------------------------------
 
@@ -69,26 +78,15 @@ struct LinkCase {
     std::function<void()> operations;
 };
 const LinkCase kLinkCases[] = {
-    {kConf, [] {
-         const UsbPrinterConf usb = UsbSetupRecord();
-         XAVOPrinterConfSetup(&usb, 0);
-         const NetPrinterConf net = NetRecord();
-         XAVOPrinterNetConfSetup(&net, 0);
-         const PrinterGoogleInfo cloud = Cloud("pw");
-         XAVOPrinterGoogleInfoSet(&cloud);
-     }},
+    {kConf, [] { SetUpUsb(); SetUpNet(); SetCloud(); }},
     {kNptab, [] {
+         AddNet();
          const NetPrinterConf net = NetRecord();
-         XAVOPrinterNetUpdateConf(1, &net);
          XAVOPrinterNetUpdateConf(0, &net);
      }},
-    {kSmbConf, [] {
-         const NetPrinterConf net = NetRecord();
-         XAVOPrinterNetUpdateConf(1, &net);
-     }},
+    {kSmbConf, AddNet},
     {kUsbtab, [] {
-         PlugPrinter();
-         XAVOPrinterEnableExt(1, "lp0", "1-1");
+         PlugIn();
          XAVOPrinterEnableExt(0, nullptr, "1-1");
      }},
     {"/tmp/usbip_04b8:0005:SN0001", [] {
@@ -100,34 +98,13 @@ const LinkCase kLinkCases[] = {
          XAVOPrinterUsbipLockRelease(kPrinter);
      }},
     {kCupsConf, [] { XAVOPrinterCupsUsbConfRmAll(); }},
-    {"/run/xavosdk/lock/lock_printer", [] {
-         const UsbPrinterConf usb = UsbSetupRecord();
-         XAVOPrinterConfSetup(&usb, 0);
-     }},
-    {"/run/xavosdk/lock/LOCK_USBIDMAP", [] {
-         PlugPrinter();
-         XAVOPrinterEnableExt(1, "lp0", "1-1");
-     }},
-    {kUsbtabLock, [] {
-         PlugPrinter();
-         XAVOPrinterEnableExt(1, "lp0", "1-1");
-     }},
-    {"/usr/xavo/etc/.printer.conf.lock", [] {
-         const UsbPrinterConf usb = UsbSetupRecord();
-         XAVOPrinterConfSetup(&usb, 0);
-     }},
-    {"/usr/xavo/etc/.nptab.lock", [] {
-         const NetPrinterConf net = NetRecord();
-         XAVOPrinterNetUpdateConf(1, &net);
-     }},
-    {"/etc/samba/.smb.reserved.conf.lock", [] {
-         const NetPrinterConf net = NetRecord();
-         XAVOPrinterNetUpdateConf(1, &net);
-     }},
-    {"/usr/xavo/etc/.printer_secret.key", [] {
-         const PrinterGoogleInfo cloud = Cloud("pw");
-         XAVOPrinterGoogleInfoSet(&cloud);
-     }},
+    {"/run/xavosdk/lock/lock_printer", SetUpUsb},
+    {"/run/xavosdk/lock/LOCK_USBIDMAP", PlugIn},
+    {kUsbtabLock, PlugIn},
+    {"/usr/xavo/etc/.printer.conf.lock", SetUpUsb},
+    {"/usr/xavo/etc/.nptab.lock", AddNet},
+    {"/etc/samba/.smb.reserved.conf.lock", AddNet},
+    {"/usr/xavo/etc/.printer_secret.key", SetCloud},
 };
 
 // Each path with a link to an existing file, which must keep its text, and

@@ -17,6 +17,8 @@
 #include "sandbox/avahi.h"
 #include "sandbox/cupsd.h"
 #include "sandbox/snmpd.h"
+#include "support/paths.h"
+#include "support/proof_tally.h"
 #include "support/records.h"
 #include "support/written_files.h"
 #include "xavoprinter.h"
@@ -54,6 +56,10 @@ std::vector<Payload> Payloads() {
 template <size_t N>
 void Fill(char (&field)[N], const std::string &text) {
     std::snprintf(field, N, "%s", text.c_str());
+}
+template <class... Fields>
+void FillAll(const std::string &text, Fields &...fields) {
+    (Fill(fields, text), ...);
 }
 
 std::string Hex(const std::string &text) {
@@ -98,16 +104,9 @@ const std::string kRecordId = "04b8:0005:REC";
 Expected SetUpUsbRecord(const std::string &id, const std::string &text) {
     UsbPrinterConf conf{};
     Fill(conf.szPrinterId, id);
-    for (auto field : {conf.szMode, conf.szProducer, conf.szDriverBrand, conf.szDriver}) {
-        std::snprintf(field, sizeof conf.szMode, "%s", text.c_str());
-    }
-    Fill(conf.szManualLockTimer, text);
-    Fill(conf.szAutoLockTimer, text);
-    Fill(conf.szProductName, text);
-    Fill(conf.szEnableAirprint, text);
-    Fill(conf.szEnableGoogleCloudPrint, text);
-    Fill(conf.szUsblpStringId, text);
-    Fill(conf.szFitToPage, text);
+    FillAll(text, conf.szMode, conf.szProducer, conf.szDriverBrand, conf.szDriver, conf.szManualLockTimer,
+            conf.szAutoLockTimer, conf.szProductName, conf.szEnableAirprint, conf.szEnableGoogleCloudPrint,
+            conf.szUsblpStringId, conf.szFitToPage);
     XAVOPrinterConfSetup(&conf, 1);
     return Expected::Usb(conf.szPrinterId);
 }
@@ -118,14 +117,9 @@ Expected SetUpNetRecord(const std::string &ip, const std::string &id, const std:
     NetPrinterConf conf = NetRecord();
     Fill(conf.szIP, ip);
     Fill(conf.szPrinterId, id);
-    for (auto field : {conf.szCupsPrinterName, conf.szBackend, conf.szQName, conf.szBrand, conf.szModel,
-                       conf.szDriverBrand, conf.szDriver}) {
-        std::snprintf(field, sizeof conf.szBackend, "%s", text.c_str());
-    }
-    Fill(conf.szEnableAirprint, text);
-    Fill(conf.szEnableGoogleCloudPrint, text);
-    Fill(conf.szStringId, text);
-    Fill(conf.szFitToPage, text);
+    FillAll(text, conf.szCupsPrinterName, conf.szBackend, conf.szQName, conf.szBrand, conf.szModel,
+            conf.szDriverBrand, conf.szDriver, conf.szEnableAirprint, conf.szEnableGoogleCloudPrint, conf.szStringId,
+            conf.szFitToPage);
     XAVOPrinterNetConfSetup(&conf, 1);
     XAVOPrinterNetUpdateConf(1, &conf);
     return Expected::Net(conf.szPrinterId, conf.szIP);
@@ -223,9 +217,7 @@ std::vector<Channel> Channels(const std::vector<NetPrinterInfo> &mdnsInfo) {
         {"network record address and ID", [](size_t, const std::string &p) { return SetUpNetRecord(p, p, kPlain); }},
         {"cloud print record", [](size_t, const std::string &p) {
              PrinterGoogleInfo info{};
-             Fill(info.szAccount, p);
-             Fill(info.szPassword, p);
-             Fill(info.szRefreshToken, p);
+             FillAll(p, info.szAccount, info.szPassword, info.szRefreshToken);
              XAVOPrinterGoogleInfoSet(&info);
              return Expected::Cloud();
          }, false},
@@ -241,7 +233,7 @@ std::vector<Channel> Channels(const std::vector<NetPrinterInfo> &mdnsInfo) {
              // queue's name is written under it.
              ORLICSzHash *hash = ORLICSzHashAlloc(8);
              ORLICSzHashSetValue(&hash, "mode", "usbip");
-             ORLICFileAddSection(kPrinterConfFile, p.c_str(), hash, "\t%s = %s\n");
+             ORLICFileAddSection(kConf, p.c_str(), hash, "\t%s = %s\n");
              ORLICSzHashFree(hash);
              XAVOPrinterCupsAdd(p.c_str(), nullptr);
              return Expected::Usb(p);
@@ -281,22 +273,19 @@ TEST(ProofInjection, NoSectionKeyOrLineOfOutsideTextInAnyFileTheLibraryWrites) {
     PlaceProgram("/usr/bin/bind_driver", "#!/bin/sh\nexit 0\n");
     const std::vector<NetPrinterInfo> mdnsInfo = BrowseAll(payloads.size());
 
-    int tried = 0, failed = 0;
+    Tally tally{"injection"};
     for (const Channel &channel : Channels(mdnsInfo)) {
         for (size_t i = 0; i < payloads.size(); ++i) {
             ClearWrittenFiles();
-            const Expected expected = channel.run(i, payloads[i].text);
-            const std::vector<std::string> found = Injections(expected);
-            ++tried;
+            const std::vector<std::string> found = Injections(channel.run(i, payloads[i].text));
             if (payloads[i].text == kPlain && channel.bShowsText) {
-                const std::string written = ReadFile(kPrinterConfFile) + ReadFile(kNptabFile) + ReadFile(kUsbtabFile);
+                const std::string written = ReadFile(kConf) + ReadFile(kNptab) + ReadFile(kUsbtab);
                 EXPECT_NE(written.find(kPlain), std::string::npos) << channel.szName << " carried nothing";
             }
-            if (found.empty()) continue;
-            ++failed;
-            ADD_FAILURE() << channel.szName << " / " << payloads[i].szName << ": " << found.front();
+            tally.Check(found.empty(), std::string(channel.szName) + " / " + payloads[i].szName + ": " +
+                                           (found.empty() ? "" : found.front()));
         }
     }
-    std::printf("injection: %d tried, %d failed\n", tried, failed);
-    EXPECT_EQ(failed, 0);
+    tally.Print();
+    EXPECT_EQ(tally.failed, 0);
 }

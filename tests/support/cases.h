@@ -36,13 +36,15 @@ inline std::vector<std::string> Lines(const std::string &text) {
 }
 
 // A program at path that writes each argument on a line of its own to
-// /tmp/<name>.argv, adds a line to /tmp/<name>.calls and exits with the
-// status kept in /tmp/<name>.exit (iExit, or 0 when there is none).
+// /tmp/<name>.argv, adds a line to /tmp/<name>.calls, prints
+// /tmp/<name>.out when there is one, and exits with the status kept in
+// /tmp/<name>.exit (iExit, or 0 when there is none).
 inline void PlaceRecorder(const std::string &path, const std::string &name, int iExit = 0) {
     const std::string tmp = "/tmp/" + name;
     PlaceProgram(path, "#!/bin/sh\n"
                        "for a in \"$@\"; do printf '%s\\n' \"$a\"; done > " + tmp + ".argv\n"
                        "echo run >> " + tmp + ".calls\n"
+                       "cat " + tmp + ".out 2>/dev/null\n"
                        "exit $(cat " + tmp + ".exit 2>/dev/null || echo 0)\n");
     if (iExit != 0) PlaceFile(tmp + ".exit", std::to_string(iExit) + "\n");
 }

@@ -37,6 +37,16 @@ inline std::vector<std::string> Logs() {
     return out;
 }
 
+// The library's lines of the units whose names begin with unit
+// ("printer_net_"), for suites where other units log as well.
+inline std::vector<std::string> UnitLogs(const std::string &unit) {
+    std::vector<std::string> out;
+    for (const std::string &line : Logs()) {
+        if (line.find(" " + unit) != std::string::npos) out.push_back(line);
+    }
+    return out;
+}
+
 // The other lines logged since the last call ("7 lpstat: No destinations
 // added."); the library's are dropped.
 inline std::vector<std::string> ProgramLogs() {

@@ -94,6 +94,24 @@ inline bool NothingLeft() {
     return false;
 }
 
+// Catches sig without SA_RESTART for its lifetime, so that a read blocked
+// when it arrives fails with EINTR.
+class InterruptingSignal {
+public:
+    explicit InterruptingSignal(int sig) : sig_(sig) {
+        struct sigaction sa {};
+        sa.sa_handler = [](int) {};
+        sigaction(sig, &sa, &old_);
+    }
+    InterruptingSignal(const InterruptingSignal &) = delete;
+    InterruptingSignal &operator=(const InterruptingSignal &) = delete;
+    ~InterruptingSignal() { sigaction(sig_, &old_, nullptr); }
+
+private:
+    int sig_;
+    struct sigaction old_ {};
+};
+
 // The ways a service may handle SIGCHLD, which must never change what the
 // platform's runs answer.
 inline std::atomic<int> gReapingHandlerCalls{0};

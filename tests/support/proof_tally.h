@@ -2,7 +2,10 @@
 // as one line "NAME: N tried, M failed".
 #pragma once
 
+#include <gtest/gtest.h>
+
 #include <cstdio>
+#include <string>
 
 namespace xavo::test {
 
@@ -15,6 +18,11 @@ struct Tally {
     bool Check(bool bOk) {
         ++tried;
         if (!bOk) ++failed;
+        return bOk;
+    }
+    // The same, failing the test with what went wrong.
+    bool Check(bool bOk, const std::string &what) {
+        if (!Check(bOk)) ADD_FAILURE() << what;
         return bOk;
     }
     void Print() const {

@@ -1,6 +1,6 @@
-// Reading and writing whole sections of the appliance's section files
-// through the platform, for tests that set up or check them, and the texts
-// of a string list.
+// Reading and writing whole sections of the appliance's section files, and
+// reading its table files, through the platform, for tests that set up or
+// check them; and the texts of a string list.
 #pragma once
 
 #include <gtest/gtest.h>
@@ -15,16 +15,28 @@ namespace xavo::test {
 
 using Section = std::map<std::string, std::string>;
 
-inline Section ReadSection(const std::string &path, const std::string &name) {
-    ORLICSzHash *hash = ORLICSzHashAlloc(512);
-    ORLICFileGetSection(path.c_str(), name.c_str(), &hash);
-    ORLICSzList *keys = ORLICSzListAlloc(256);
+// The keys and values of a hash, which is freed.
+inline Section TakeHash(ORLICSzHash *hash) {
+    ORLICSzList *keys = ORLICSzListAlloc(1024);
     Section out;
-    int n = ORLICSzHashEnumKey(hash, &keys);
+    const int n = ORLICSzHashEnumKey(hash, &keys);
     for (int i = 0; i < n; ++i) out[ORLICSzListGet(keys, i)] = ORLICSzHashGetValue(hash, ORLICSzListGet(keys, i));
     ORLICSzListFree(keys);
     ORLICSzHashFree(hash);
     return out;
+}
+
+inline Section ReadSection(const std::string &path, const std::string &name) {
+    ORLICSzHash *hash = ORLICSzHashAlloc(512);
+    ORLICFileGetSection(path.c_str(), name.c_str(), &hash);
+    return TakeHash(hash);
+}
+
+// The key-value pairs of a table file (nptab, usbtab).
+inline Section ReadPairs(const std::string &path) {
+    ORLICSzHash *hash = ORLICSzHashAlloc(1024);
+    ORLICFileGetPair(path.c_str(), &hash);
+    return TakeHash(hash);
 }
 
 inline void WriteSection(const std::string &path, const std::string &name, const Section &keys) {

@@ -12,6 +12,7 @@
 #include <vector>
 
 #include "sandbox/sandbox.h"
+#include "support/paths.h"
 
 namespace xavo::test {
 
@@ -25,11 +26,6 @@ inline const Keys kNetSectionKeys = {"IP", "cups printer name", "Backend", "QNam
                                      "string id", "fit to page"};
 inline const Keys kCloudSectionKeys = {"google account", "google pass", "refresh token"};
 inline const Keys kSmbShareKeys = {"comment", "path", "browseable", "public", "guest ok", "writable", "printable"};
-
-inline constexpr char kPrinterConfFile[] = "/usr/xavo/etc/printer.conf";
-inline constexpr char kNptabFile[] = "/usr/xavo/etc/nptab";
-inline constexpr char kUsbtabFile[] = "/tmp/usbtab";
-inline constexpr char kSmbReservedFile[] = "/etc/samba/smb.reserved.conf";
 
 // What one call sequence may have written: sections of the printer
 // configuration file with their keys, and the keys of the two tables.  The
@@ -128,16 +124,16 @@ inline std::vector<std::string> UsbipFiles() {
 
 inline std::vector<std::string> Injections(const Expected &expected) {
     std::vector<std::string> found;
-    CheckSectionFile(kPrinterConfFile, expected.sections, &found);
-    CheckSectionFile(kSmbReservedFile, {{"printers", &kSmbShareKeys}}, &found);
-    CheckKeyValueFile(kNptabFile, expected.nptabKeys, &found);
-    CheckKeyValueFile(kUsbtabFile, expected.usbtabKeys, &found);
+    CheckSectionFile(kConf, expected.sections, &found);
+    CheckSectionFile(kSmbConf, {{"printers", &kSmbShareKeys}}, &found);
+    CheckKeyValueFile(kNptab, expected.nptabKeys, &found);
+    CheckKeyValueFile(kUsbtab, expected.usbtabKeys, &found);
     for (const std::string &path : UsbipFiles()) found.push_back(path + ": written");
     return found;
 }
 
 inline void ClearWrittenFiles() {
-    for (const char *szFile : {kPrinterConfFile, kNptabFile, kUsbtabFile, kSmbReservedFile}) {
+    for (const char *szFile : {kConf, kNptab, kUsbtab, kSmbConf}) {
         std::filesystem::remove(szFile);
     }
     for (const std::string &path : UsbipFiles()) std::filesystem::remove(path);
