@@ -3,7 +3,6 @@
 #pragma once
 
 #include <string>
-#include <string_view>
 #include <vector>
 
 #include "common/appliance.h"
@@ -21,9 +20,5 @@ void ResetToolTimeLimit();
 // when signal N killed it, or -1 when it could not be started, was stopped
 // at its limit or could not be waited for (*pFailure then says where).
 int32_t RunAndWait(const char *szProgram, const std::vector<std::string> &argv, xavo::platform::Failure *pFailure);
-
-// True when a live (not zombie) process has the given name as its command
-// name (the kernel keeps the first 15 characters).
-bool ProcessAlive(std::string_view name);
 
 }  // namespace xavo::core
