@@ -1,6 +1,6 @@
-// The appliance's small text files: reading them whole, replacing them
-// atomically, and the pure line parsers of the two forms the platform
-// writes (section files and key="value" files).
+// The appliance's small text files: reading them whole and replacing them
+// atomically (text_files.cc), and the pure line parsers of the two forms
+// the platform writes, section files and key="value" files (text_lines.cc).
 #pragma once
 
 #include <optional>
