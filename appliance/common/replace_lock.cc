@@ -6,6 +6,7 @@
 #include <cerrno>
 #include <chrono>
 #include <cstdio>
+#include <optional>
 
 #include "common/pause.h"
 #include "common/temp_files.h"
@@ -118,30 +119,24 @@ bool IsTrustedFile(const struct stat &st) {
 bool FileWriteLock::Take(const char *szPath, Failure *pFailure) {
     const std::string lockPath = LockPathOf(szPath);
     const bool bShared = IsSharedDirectory(DirName(lockPath));
-    const Deadline deadline(kLockWait);
-    for (;;) {
+    // A failure with code 0 once taken.
+    const auto settled = RetryWithin(kLockWait, kRetryNs, [&]() -> std::optional<Failure> {
         Fd fd(OpenLockFile(lockPath, bShared));
-        if (fd.get() < 0) {
-            *pFailure = {kErrOpen, __LINE__};
-            return false;
-        }
+        if (fd.get() < 0) return Failure{kErrOpen, __LINE__};
         // Locked, the file must still be the one at the name: a planted one
         // swapped out meanwhile is nobody's lock any more.
         if (TryLockExclusive(fd.get())) {
-            if (StillNamed(fd.get(), lockPath)) {
-                fd_.reset(fd.release());
-                return true;
-            }
-        } else if (errno != EWOULDBLOCK) {
-            *pFailure = {kErrLock, __LINE__};
-            return false;
+            if (!StillNamed(fd.get(), lockPath)) return std::nullopt;
+            fd_.reset(fd.release());
+            return Failure{};
         }
-        if (deadline.Passed()) {
-            *pFailure = {kErrLock, __LINE__};
-            return false;
-        }
-        Pause(kRetryNs);
-    }
+        if (errno == EWOULDBLOCK) return std::nullopt;
+        return Failure{kErrLock, __LINE__};
+    });
+    const Failure failure = settled.value_or(Failure{kErrLock, __LINE__});
+    if (failure.code == 0) return true;
+    *pFailure = failure;
+    return false;
 }
 
 }  // namespace xavo::platform

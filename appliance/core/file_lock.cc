@@ -10,6 +10,7 @@
 #include <cstring>
 #include <map>
 #include <mutex>
+#include <optional>
 #include <string>
 
 #include "common/appliance.h"
@@ -172,33 +173,28 @@ XAVO_PLATFORM_API int32_t ORLICFileLock(uint32_t uLockAndFlags, int32_t iTimeout
     uint32_t op = uLockAndFlags & ~kLockIdMask;
     bool bExclusive = (op & kLockOpExclusive) != 0 || (op & kLockOpShared) == 0;
     return XAVO_GUARD(int32_t{-1}, [&] {
-        const Deadline deadline{std::chrono::seconds(iTimeout)};
         HeldLocks &held = HeldLocks::Get();
-        for (;;) {
-            {
-                // Another thread of this process holding the lock is busy
-                // like another process.  The table's slot is made before the
-                // attempt, so that a lock taken is never lost to a failed
-                // allocation.
-                std::lock_guard guard(held.mutex);
-                auto [slot, bFree] = held.table.try_emplace(id, -1);
-                if (bFree) {
-                    int fd = TryLockFile(lock->path, bExclusive);
-                    if (fd >= 0) {
-                        slot->second = fd;
-                        return int32_t{0};
-                    }
-                    held.table.erase(slot);
-                    if (fd == -2) {
-                        SetError(kErrOpen, kUnit, __LINE__);
-                        return int32_t{-1};
-                    }
-                }
+        // 0 once taken, ERR_OPEN when the lock file cannot be used.
+        const auto attempt = [&]() -> std::optional<uint32_t> {
+            // Another thread of this process holding the lock is busy like
+            // another process.  The table's slot is made before the
+            // attempt, so that a lock taken is never lost to a failed
+            // allocation.
+            std::lock_guard guard(held.mutex);
+            auto [slot, bFree] = held.table.try_emplace(id, -1);
+            if (!bFree) return std::nullopt;
+            int fd = TryLockFile(lock->path, bExclusive);
+            if (fd >= 0) {
+                slot->second = fd;
+                return uint32_t{0};
             }
-            if (deadline.Passed()) break;
-            Pause(kLockRetryNs);
-        }
-        SetError(kErrLock, kUnit, __LINE__);
+            held.table.erase(slot);
+            if (fd == -2) return kErrOpen;
+            return std::nullopt;
+        };
+        const uint32_t uCode = RetryWithin(std::chrono::seconds(iTimeout), kLockRetryNs, attempt).value_or(kErrLock);
+        if (uCode == 0) return int32_t{0};
+        SetError(uCode, kUnit, __LINE__);
         return int32_t{-1};
     });
 }
