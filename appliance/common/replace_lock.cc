@@ -125,7 +125,7 @@ bool FileWriteLock::Take(const char *szPath, Failure *pFailure) {
         if (fd.get() < 0) return Failure{kErrOpen, __LINE__};
         // Locked, the file must still be the one at the name: a planted one
         // swapped out meanwhile is nobody's lock any more.
-        if (TryLockExclusive(fd.get())) {
+        if (TryLock(fd.get(), true)) {
             if (!StillNamed(fd.get(), lockPath)) return std::nullopt;
             fd_.reset(fd.release());
             return Failure{};

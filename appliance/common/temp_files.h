@@ -31,8 +31,9 @@ int CreateLockedTemp(std::string *pTemplate);
 // file that cannot be examined stays.
 void RemoveStaleTemps(const std::string &tmpl);
 
-// One attempt at an exclusive flock, not waiting for a holder.
-bool TryLockExclusive(int fd);
+// One attempt at an exclusive (or shared) flock, not waiting for a holder;
+// false with errno set (EWOULDBLOCK: held elsewhere).
+bool TryLock(int fd, bool bExclusive);
 // Whether the path still names the open file (a link at it does not).
 bool StillNamed(int fd, const std::string &path);
 

@@ -1,7 +1,6 @@
 // Files and locks: existence, temporary files, lock files, and the
 // appliance-wide named locks.
 #include <fcntl.h>
-#include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -14,6 +13,7 @@
 #include <string>
 
 #include "common/appliance.h"
+#include "common/fd.h"
 #include "common/pause.h"
 #include "common/temp_files.h"
 #include "core/fork_local.h"
@@ -79,20 +79,11 @@ int TryLockFile(const char *szPath, bool bExclusive) {
     // directories are made only when missing (after a restart): the lock is
     // taken around every write of the printer configuration.
     constexpr int kFlags = O_RDONLY | O_CREAT | O_NOFOLLOW | O_CLOEXEC | O_NOCTTY;
-    int fd = ::open(szPath, kFlags, kLockFileMode);
-    if (fd < 0 && errno == ENOENT && MakeParentDirs(szPath)) fd = ::open(szPath, kFlags, kLockFileMode);
-    if (fd < 0) return -2;
-    int r;
-    do {
-        r = ::flock(fd, (bExclusive ? LOCK_EX : LOCK_SH) | LOCK_NB);
-    } while (r != 0 && errno == EINTR);
-    if (r != 0) {
-        int saved = errno;
-        ::close(fd);
-        errno = saved;
-        return saved == EWOULDBLOCK ? -1 : -2;
-    }
-    return fd;
+    Fd fd(::open(szPath, kFlags, kLockFileMode));
+    if (fd.get() < 0 && errno == ENOENT && MakeParentDirs(szPath)) fd.reset(::open(szPath, kFlags, kLockFileMode));
+    if (fd.get() < 0) return -2;
+    if (!TryLock(fd.get(), bExclusive)) return errno == EWOULDBLOCK ? -1 : -2;
+    return fd.release();
 }
 
 }  // namespace
