@@ -41,18 +41,6 @@ private:
     bool committed_ = false;
 };
 
-bool WriteAll(int fd, std::string_view data) {
-    while (!data.empty()) {
-        ssize_t n = ::write(fd, data.data(), data.size());
-        if (n < 0) {
-            if (errno == EINTR) continue;
-            return false;
-        }
-        data.remove_prefix(static_cast<size_t>(n));
-    }
-    return true;
-}
-
 // Whether a file that fails the trust of a shared directory is in one: it
 // is then ignored by readers and replaced by writers.  The directory is
 // looked at only for such files, so root's ordinary files cost nothing.
@@ -115,6 +103,18 @@ bool ReadWhole(int fd, size_t sizeHint, std::string *pText) {
 }
 
 }  // namespace
+
+bool WriteAll(int fd, std::string_view data) {
+    while (!data.empty()) {
+        ssize_t n = ::write(fd, data.data(), data.size());
+        if (n < 0) {
+            if (errno == EINTR) continue;
+            return false;
+        }
+        data.remove_prefix(static_cast<size_t>(n));
+    }
+    return true;
+}
 
 ReadResult ReadTextFile(const char *szPath, std::string *pText) {
     // O_NONBLOCK: a FIFO planted at the path must not hang the reader; it is
