@@ -2,12 +2,24 @@
 // interface (and so not counted by the test controls).
 #pragma once
 
+#include <cstdint>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "common/appliance.h"
 
 namespace xavo::core {
+
+// FNV-1a: the string hash's buckets and the test controls' counter slots.
+inline uint32_t HashOf(std::string_view text) {
+    uint32_t h = 2166136261u;
+    for (char c : text) {
+        h ^= static_cast<unsigned char>(c);
+        h *= 16777619u;
+    }
+    return h;
+}
 
 // Closes every named lock this process holds (the test controls' reset).
 void ReleaseNamedLocks();

@@ -6,8 +6,10 @@
 
 #include "common/appliance.h"
 #include "core/containers.h"
+#include "core/internal.h"
 
 using namespace xavo::platform;
+using xavo::core::HashOf;
 
 namespace {
 constexpr char kUnit[] = "sz_containers";
@@ -16,15 +18,6 @@ constexpr int32_t kMinHashCapacity = 16;
 
 // The next capacity of a growing vector: doubling keeps n inserts at O(n).
 size_t GrownCapacity(size_t n) { return n < 8 ? 16 : 2 * n; }
-
-uint32_t HashOf(std::string_view key) {
-    uint32_t h = 2166136261u;  // FNV-1a
-    for (char c : key) {
-        h ^= static_cast<unsigned char>(c);
-        h *= 16777619u;
-    }
-    return h;
-}
 
 }  // namespace
 
