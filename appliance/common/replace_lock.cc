@@ -37,8 +37,7 @@ std::string LockPathOf(const char *szPath) {
 // 0600 in a shared directory: anybody who can open a lock file can flock it
 // and so keep root's writers out.
 bool IsOurLockFile(const struct stat &st, bool bShared) {
-    return S_ISREG(st.st_mode) && st.st_uid == ::geteuid() && st.st_nlink == 1 &&
-           (!bShared || (st.st_mode & 077) == 0);
+    return IsOwnFile(st) && (!bShared || (st.st_mode & 077) == 0);
 }
 
 // Errors of opening a name that something other than a lock file holds

@@ -56,7 +56,7 @@ void RemoveIfStale(int dirFd, const char *szName) {
     Fd fd(::openat(dirFd, szName, O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC | O_NOCTTY));
     if (fd.get() < 0) return;
     struct stat st {};
-    if (::fstat(fd.get(), &st) != 0 || !S_ISREG(st.st_mode) || st.st_uid != ::geteuid() || st.st_nlink != 1) return;
+    if (::fstat(fd.get(), &st) != 0 || !IsOwnFile(st)) return;
     if (!TryLock(fd.get(), true)) return;  // a live writer's
     // The name must still be the file examined: only a locked file is ever
     // removed, never whatever took its name meanwhile.
@@ -73,6 +73,10 @@ struct DirCloser {
 };
 
 }  // namespace
+
+bool IsOwnFile(const struct stat &st) {
+    return S_ISREG(st.st_mode) && st.st_uid == ::geteuid() && st.st_nlink == 1;
+}
 
 bool TryLock(int fd, bool bExclusive) {
     int r;

@@ -12,6 +12,7 @@
 // printers.conf edit) as well as those that hold the file's write lock.
 #pragma once
 
+#include <sys/stat.h>
 #include <sys/types.h>
 
 #include <string>
@@ -30,6 +31,10 @@ int CreateLockedTemp(std::string *pTemplate);
 // other users, links and anything else are never touched.  Best effort: a
 // file that cannot be examined stays.
 void RemoveStaleTemps(const std::string &tmpl);
+
+// A plain file of this process's user with one link, as its writers make
+// their temporary and lock files.
+bool IsOwnFile(const struct stat &st);
 
 // One attempt at an exclusive (or shared) flock, not waiting for a holder;
 // false with errno set (EWOULDBLOCK: held elsewhere).
