@@ -1,8 +1,10 @@
 // The platform stand-in's process runner, driven directly: every program
 // run ends within its time limit together with what it started, the
 // programs' standard error goes to syslog instead of the caller's terminal,
-// only the appliance's own file name pattern is expanded, and a caller's
-// SIGCHLD handling never changes a result.
+// only the appliance's own file name pattern is expanded, arguments reach
+// the program as given, the child gets /dev/null for input and the C
+// locale, and a caller's SIGCHLD handling never changes a result.
+#include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -24,7 +26,9 @@
 #include "xavocore.h"
 
 using ::testing::ElementsAre;
+using ::testing::HasSubstr;
 using ::testing::IsEmpty;
+using ::testing::Not;
 using namespace xavo::test;
 
 namespace {
@@ -225,4 +229,34 @@ TEST(RunnerStart, ProgramThatCannotBeStartedFailsAtOnceWithItsReason) {
     EXPECT_EQ(ORLICPopen("/usr/bin/xavo-missing", "r", nullptr), nullptr);
     EXPECT_EQ(ORLICErrGet(), 0x2A00u);
     EXPECT_THAT(Descendants(), IsEmpty());
+}
+
+// The arguments reach the program as given, never through a shell.
+TEST(PlatformProcess, PopenPassesTheArgumentsAsGivenAndReportsTheStatus) {
+    PlaceProgram("/usr/bin/xavo-show-args", "#!/bin/sh\nprintf '%s\\n' \"$@\"\nexit 4\n");
+    FILE *out = ORLICPopen("/usr/bin/xavo-show-args", "r", "a b", "$(touch /tmp/pwned)", "*", nullptr);
+    ASSERT_NE(out, nullptr);
+    EXPECT_EQ(ReadAll(out), "a b\n$(touch /tmp/pwned)\n*\n");
+    EXPECT_EQ(ORLICPclose(out), 4);
+    EXPECT_EQ(ORLICErrGet(), 0x2A00u);
+    EXPECT_FALSE(FileExists("/tmp/pwned"));
+    EXPECT_LT(ORLICPclose(stdin), 0) << "not a stream of ORLICPopen";
+}
+
+TEST(PlatformProcess, ChildGetsNullInputNoInheritedDescriptorsAndTheCLocale) {
+    int leaked = open("/dev/null", O_RDONLY);  // no O_CLOEXEC on purpose
+    ASSERT_GE(leaked, 3);
+    setenv("LANG", "de_DE.UTF-8", 1);
+    setenv("XAVO_CALLERS_SECRET", "x", 1);
+    FILE *out = ORLICPopen("/bin/sh", "r", "-c", "ls /proc/self/fd; readlink /proc/self/fd/0; env | sort", nullptr);
+    ASSERT_NE(out, nullptr);
+    std::string text = ReadAll(out);
+    EXPECT_EQ(ORLICPclose(out), 0);
+    unsetenv("LANG");
+    unsetenv("XAVO_CALLERS_SECRET");
+    close(leaked);
+    // ls has its own directory descriptor 3 open while it lists.
+    EXPECT_THAT(text, HasSubstr("0\n1\n2\n3\n/dev/null\n")) << text;
+    EXPECT_THAT(text, ::testing::AllOf(HasSubstr("LC_ALL=C\n"), HasSubstr("PATH="), Not(HasSubstr("LANG=")),
+                                       Not(HasSubstr("XAVO_CALLERS_SECRET"))));
 }

@@ -4,7 +4,8 @@
 // hold brackets or a header's text turns up inside a value), a setup's read
 // kept for its next calls never outliving the file it was read from, call
 // counters without a lock, lists that start small, and the daemon found
-// last time looked at first but never taken on trust.
+// last time looked at first but never taken on trust (the same lookup
+// answers ORLICIsProcAlive).
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -180,11 +181,13 @@ TEST(PlatformServices, DaemonFoundLastIsCheckedAgainEveryTime) {
     ASSERT_EQ(ORLIServiceIsRunning("cupsd"), 0);
     const pid_t first = StartFakeCupsd();
     EXPECT_EQ(ORLIServiceIsRunning("cupsd"), 1);
+    EXPECT_EQ(ORLICIsProcAlive("cupsd"), 1) << "the same lookup, nothing remembered";
     ASSERT_EQ(kill(first, SIGKILL), 0);
     // A zombie is no running daemon, nor a reaped one.
     for (int i = 0; i < 400 && !IsZombie(first); ++i) std::this_thread::sleep_for(std::chrono::milliseconds(5));
     ASSERT_TRUE(IsZombie(first));
     EXPECT_EQ(ORLIServiceIsRunning("cupsd"), 0) << "zombie";
+    EXPECT_EQ(ORLICIsProcAlive("cupsd"), 0) << "zombie";
     ASSERT_EQ(waitpid(first, nullptr, 0), first);
     EXPECT_EQ(ORLIServiceIsRunning("cupsd"), 0) << "reaped";
     const pid_t second = StartFakeCupsd();

@@ -6,6 +6,7 @@
 #include <cerrno>
 #include <chrono>
 #include <cstdio>
+#include <optional>
 
 #include "common/pause.h"
 #include "common/temp_files.h"
@@ -36,8 +37,7 @@ std::string LockPathOf(const char *szPath) {
 // 0600 in a shared directory: anybody who can open a lock file can flock it
 // and so keep root's writers out.
 bool IsOurLockFile(const struct stat &st, bool bShared) {
-    return S_ISREG(st.st_mode) && st.st_uid == ::geteuid() && st.st_nlink == 1 &&
-           (!bShared || (st.st_mode & 077) == 0);
+    return IsOwnFile(st) && (!bShared || (st.st_mode & 077) == 0);
 }
 
 // Errors of opening a name that something other than a lock file holds
@@ -118,30 +118,24 @@ bool IsTrustedFile(const struct stat &st) {
 bool FileWriteLock::Take(const char *szPath, Failure *pFailure) {
     const std::string lockPath = LockPathOf(szPath);
     const bool bShared = IsSharedDirectory(DirName(lockPath));
-    const Deadline deadline(kLockWait);
-    for (;;) {
+    // A failure with code 0 once taken.
+    const auto settled = RetryWithin(kLockWait, kRetryNs, [&]() -> std::optional<Failure> {
         Fd fd(OpenLockFile(lockPath, bShared));
-        if (fd.get() < 0) {
-            *pFailure = {kErrOpen, __LINE__};
-            return false;
-        }
+        if (fd.get() < 0) return Failure{kErrOpen, __LINE__};
         // Locked, the file must still be the one at the name: a planted one
         // swapped out meanwhile is nobody's lock any more.
-        if (TryLockExclusive(fd.get())) {
-            if (StillNamed(fd.get(), lockPath)) {
-                fd_.reset(fd.release());
-                return true;
-            }
-        } else if (errno != EWOULDBLOCK) {
-            *pFailure = {kErrLock, __LINE__};
-            return false;
+        if (TryLock(fd.get(), true)) {
+            if (!StillNamed(fd.get(), lockPath)) return std::nullopt;
+            fd_.reset(fd.release());
+            return Failure{};
         }
-        if (deadline.Passed()) {
-            *pFailure = {kErrLock, __LINE__};
-            return false;
-        }
-        Pause(kRetryNs);
-    }
+        if (errno == EWOULDBLOCK) return std::nullopt;
+        return Failure{kErrLock, __LINE__};
+    });
+    const Failure failure = settled.value_or(Failure{kErrLock, __LINE__});
+    if (failure.code == 0) return true;
+    *pFailure = failure;
+    return false;
 }
 
 }  // namespace xavo::platform

@@ -56,8 +56,8 @@ void RemoveIfStale(int dirFd, const char *szName) {
     Fd fd(::openat(dirFd, szName, O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC | O_NOCTTY));
     if (fd.get() < 0) return;
     struct stat st {};
-    if (::fstat(fd.get(), &st) != 0 || !S_ISREG(st.st_mode) || st.st_uid != ::geteuid() || st.st_nlink != 1) return;
-    if (!TryLockExclusive(fd.get())) return;  // a live writer's
+    if (::fstat(fd.get(), &st) != 0 || !IsOwnFile(st)) return;
+    if (!TryLock(fd.get(), true)) return;  // a live writer's
     // The name must still be the file examined: only a locked file is ever
     // removed, never whatever took its name meanwhile.
     struct stat now {};
@@ -74,10 +74,14 @@ struct DirCloser {
 
 }  // namespace
 
-bool TryLockExclusive(int fd) {
+bool IsOwnFile(const struct stat &st) {
+    return S_ISREG(st.st_mode) && st.st_uid == ::geteuid() && st.st_nlink == 1;
+}
+
+bool TryLock(int fd, bool bExclusive) {
     int r;
     do {
-        r = ::flock(fd, LOCK_EX | LOCK_NB);
+        r = ::flock(fd, (bExclusive ? LOCK_EX : LOCK_SH) | LOCK_NB);
     } while (r != 0 && errno == EINTR);
     return r == 0;
 }
@@ -117,7 +121,7 @@ int CreateLockedTemp(std::string *pTemplate) {
         // the new file for a killed writer's: it then holds the lock, or
         // has removed the name.  Such a file is left to the sweep, and the
         // writer makes another.
-        if (TryLockExclusive(fd.get()) && StillNamed(fd.get(), name)) return fd.release();
+        if (TryLock(fd.get(), true) && StillNamed(fd.get(), name)) return fd.release();
     }
     errno = EEXIST;
     return -1;

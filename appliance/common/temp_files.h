@@ -12,6 +12,7 @@
 // printers.conf edit) as well as those that hold the file's write lock.
 #pragma once
 
+#include <sys/stat.h>
 #include <sys/types.h>
 
 #include <string>
@@ -31,8 +32,13 @@ int CreateLockedTemp(std::string *pTemplate);
 // file that cannot be examined stays.
 void RemoveStaleTemps(const std::string &tmpl);
 
-// One attempt at an exclusive flock, not waiting for a holder.
-bool TryLockExclusive(int fd);
+// A plain file of this process's user with one link, as its writers make
+// their temporary and lock files.
+bool IsOwnFile(const struct stat &st);
+
+// One attempt at an exclusive (or shared) flock, not waiting for a holder;
+// false with errno set (EWOULDBLOCK: held elsewhere).
+bool TryLock(int fd, bool bExclusive);
 // Whether the path still names the open file (a link at it does not).
 bool StillNamed(int fd, const std::string &path);
 

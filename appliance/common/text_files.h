@@ -1,6 +1,6 @@
-// The appliance's small text files: reading them whole, replacing them
-// atomically, and the pure line parsers of the two forms the platform
-// writes (section files and key="value" files).
+// The appliance's small text files: reading them whole and replacing them
+// atomically (text_files.cc), and the pure line parsers of the two forms
+// the platform writes, section files and key="value" files (text_lines.cc).
 #pragma once
 
 #include <optional>
@@ -34,11 +34,14 @@ ReadResult ReadTextFile(const char *szPath, std::string *pText);
 // file is unchanged and *pFailure tells the code and line to report.
 bool ReplaceFile(const char *szPath, std::string_view content, Failure *pFailure);
 
-// The two above for an exported operation of the stand-ins, which report
-// failures through the last error under their own unit's name.  Loading
-// fails with ERR_OPEN (also for a symlink or a FIFO planted at the path); a
-// missing file reads as an empty one when bMissingIsEmpty.  Storing fails
-// with the code and line ReplaceFile gives.
+// Writes all of data, going on after interruptions; false with errno set.
+bool WriteAll(int fd, std::string_view data);
+
+// ReadTextFile and ReplaceFile for an exported operation of the stand-ins,
+// which report failures through the last error under their own unit's
+// name.  Loading fails with ERR_OPEN (also for a symlink or a FIFO planted
+// at the path); a missing file reads as an empty one when bMissingIsEmpty.
+// Storing fails with the code and line ReplaceFile gives.
 bool LoadTextFile(const char *szPath, bool bMissingIsEmpty, std::string *pText, const char *szUnit, int iLine);
 bool StoreTextFile(const char *szPath, std::string_view text, const char *szUnit);
 

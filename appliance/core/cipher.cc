@@ -21,10 +21,12 @@
 #include <cerrno>
 #include <cstring>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "common/appliance.h"
 #include "common/fd.h"
+#include "common/text_files.h"
 
 using namespace xavo::platform;
 
@@ -62,17 +64,6 @@ struct Secret {
 bool ReadExactly(int fd, unsigned char *p, size_t n) {
     while (n > 0) {
         ssize_t r = ::read(fd, p, n);
-        if (r < 0 && errno == EINTR) continue;
-        if (r <= 0) return false;
-        p += r;
-        n -= static_cast<size_t>(r);
-    }
-    return true;
-}
-
-bool WriteExactly(int fd, const unsigned char *p, size_t n) {
-    while (n > 0) {
-        ssize_t r = ::write(fd, p, n);
         if (r < 0 && errno == EINTR) continue;
         if (r <= 0) return false;
         p += r;
@@ -119,8 +110,8 @@ bool CreateKey(Failure *pFailure) {
     }
     Key key;
     crypto_secretbox_keygen(key.bytes);
-    bool bOk = ::fchmod(fd.get(), kKeyMode) == 0 && WriteExactly(fd.get(), key.bytes, sizeof key.bytes) &&
-               ::fsync(fd.get()) == 0;
+    const std::string_view bytes(reinterpret_cast<const char *>(key.bytes), sizeof key.bytes);
+    bool bOk = ::fchmod(fd.get(), kKeyMode) == 0 && WriteAll(fd.get(), bytes) && ::fsync(fd.get()) == 0;
     if (!bOk) {
         *pFailure = {kErrWrite, __LINE__};
     } else if (::link(temp.c_str(), kKeyPath) != 0 && errno != EEXIST) {

@@ -1,8 +1,6 @@
 // Files and locks: existence, temporary files, lock files, and the
 // appliance-wide named locks.
 #include <fcntl.h>
-#include <pthread.h>
-#include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -11,11 +9,14 @@
 #include <cstring>
 #include <map>
 #include <mutex>
+#include <optional>
 #include <string>
 
 #include "common/appliance.h"
+#include "common/fd.h"
 #include "common/pause.h"
 #include "common/temp_files.h"
+#include "core/fork_local.h"
 #include "core/internal.h"
 
 using namespace xavo::platform;
@@ -53,35 +54,13 @@ constexpr NamedLock kNamedLocks[] = {
 
 // Named locks this process holds, by identifier: the descriptor that holds a
 // lock must stay open between ORLICFileLock and ORLICFileUnlock, and the
-// caller gets no handle for it.
-struct HeldLocks {
-    std::mutex mutex;
-    std::map<uint32_t, int> fds;
-};
-HeldLocks &Held();
-
-// A child forked by the host does not hold the locks of its parent: it
-// forgets them (closing its copies of the descriptors, which leaves the
-// parent's locks in place) instead of believing it holds them.
-void BeforeFork() { Held().mutex.lock(); }
-void AfterForkParent() { Held().mutex.unlock(); }
-void AfterForkChild() {
-    HeldLocks &held = Held();
-    for (auto &[id, fd] : held.fds) ::close(fd);
-    held.fds.clear();
-    held.mutex.unlock();
-}
-
-HeldLocks &Held() {
-    static HeldLocks *held = [] {
-        static HeldLocks locks;
-        pthread_atfork(BeforeFork, AfterForkParent, AfterForkChild);
-        return &locks;
-    }();
-    return *held;
-}
-// Registered when the library is loaded, before the host can fork.
-[[maybe_unused]] const bool kForkHandlers = (Held(), true);
+// caller gets no handle for it.  A child forked by the host does not hold
+// the locks of its parent: it forgets them (closing its copies of the
+// descriptors, which leaves the parent's locks in place) instead of
+// believing it holds them.
+void ForgetLock(std::pair<const uint32_t, int> &entry) { ::close(entry.second); }
+using HeldLocks = xavo::core::ForkLocal<std::map<uint32_t, int>, ForgetLock>;
+[[maybe_unused]] const bool kForkHandlers = (HeldLocks::Get(), true);
 
 // mkdir -p of the lock file's directory.
 bool MakeParentDirs(const std::string &path) {
@@ -100,20 +79,11 @@ int TryLockFile(const char *szPath, bool bExclusive) {
     // directories are made only when missing (after a restart): the lock is
     // taken around every write of the printer configuration.
     constexpr int kFlags = O_RDONLY | O_CREAT | O_NOFOLLOW | O_CLOEXEC | O_NOCTTY;
-    int fd = ::open(szPath, kFlags, kLockFileMode);
-    if (fd < 0 && errno == ENOENT && MakeParentDirs(szPath)) fd = ::open(szPath, kFlags, kLockFileMode);
-    if (fd < 0) return -2;
-    int r;
-    do {
-        r = ::flock(fd, (bExclusive ? LOCK_EX : LOCK_SH) | LOCK_NB);
-    } while (r != 0 && errno == EINTR);
-    if (r != 0) {
-        int saved = errno;
-        ::close(fd);
-        errno = saved;
-        return saved == EWOULDBLOCK ? -1 : -2;
-    }
-    return fd;
+    Fd fd(::open(szPath, kFlags, kLockFileMode));
+    if (fd.get() < 0 && errno == ENOENT && MakeParentDirs(szPath)) fd.reset(::open(szPath, kFlags, kLockFileMode));
+    if (fd.get() < 0) return -2;
+    if (!TryLock(fd.get(), bExclusive)) return errno == EWOULDBLOCK ? -1 : -2;
+    return fd.release();
 }
 
 }  // namespace
@@ -194,43 +164,37 @@ XAVO_PLATFORM_API int32_t ORLICFileLock(uint32_t uLockAndFlags, int32_t iTimeout
     uint32_t op = uLockAndFlags & ~kLockIdMask;
     bool bExclusive = (op & kLockOpExclusive) != 0 || (op & kLockOpShared) == 0;
     return XAVO_GUARD(int32_t{-1}, [&] {
-        const Deadline deadline{std::chrono::seconds(iTimeout)};
-        HeldLocks &held = Held();
-        for (;;) {
-            {
-                // Another thread of this process holding the lock is busy
-                // like another process.  The table's slot is made before the
-                // attempt, so that a lock taken is never lost to a failed
-                // allocation.
-                std::lock_guard guard(held.mutex);
-                auto [slot, bFree] = held.fds.try_emplace(id, -1);
-                if (bFree) {
-                    int fd = TryLockFile(lock->path, bExclusive);
-                    if (fd >= 0) {
-                        slot->second = fd;
-                        return int32_t{0};
-                    }
-                    held.fds.erase(slot);
-                    if (fd == -2) {
-                        SetError(kErrOpen, kUnit, __LINE__);
-                        return int32_t{-1};
-                    }
-                }
+        HeldLocks &held = HeldLocks::Get();
+        // 0 once taken, ERR_OPEN when the lock file cannot be used.
+        const auto attempt = [&]() -> std::optional<uint32_t> {
+            // Another thread of this process holding the lock is busy like
+            // another process.  The table's slot is made before the
+            // attempt, so that a lock taken is never lost to a failed
+            // allocation.
+            std::lock_guard guard(held.mutex);
+            auto [slot, bFree] = held.table.try_emplace(id, -1);
+            if (!bFree) return std::nullopt;
+            int fd = TryLockFile(lock->path, bExclusive);
+            if (fd >= 0) {
+                slot->second = fd;
+                return uint32_t{0};
             }
-            if (deadline.Passed()) break;
-            Pause(kLockRetryNs);
-        }
-        SetError(kErrLock, kUnit, __LINE__);
+            held.table.erase(slot);
+            if (fd == -2) return kErrOpen;
+            return std::nullopt;
+        };
+        const uint32_t uCode = RetryWithin(std::chrono::seconds(iTimeout), kLockRetryNs, attempt).value_or(kErrLock);
+        if (uCode == 0) return int32_t{0};
+        SetError(uCode, kUnit, __LINE__);
         return int32_t{-1};
     });
 }
 
 namespace xavo::core {
 void ReleaseNamedLocks() {
-    HeldLocks &held = Held();
+    HeldLocks &held = HeldLocks::Get();
     std::lock_guard guard(held.mutex);
-    for (auto &[id, fd] : held.fds) ::close(fd);
-    held.fds.clear();
+    held.ForgetAll();
 }
 }  // namespace xavo::core
 
@@ -239,17 +203,17 @@ void ReleaseNamedLocks() {
 XAVO_PLATFORM_API int32_t ORLICFileUnlock(uint32_t uLock) {
     uint32_t uInjected = 0;
     bool bInjected = XavoStandinEnter(__func__, 1, &uInjected) != 0;
-    HeldLocks &held = Held();
+    HeldLocks &held = HeldLocks::Get();
     std::lock_guard guard(held.mutex);
-    auto it = held.fds.find(uLock & kLockIdMask);
-    if (it == held.fds.end()) {
+    auto it = held.table.find(uLock & kLockIdMask);
+    if (it == held.table.end()) {
         SetError(kErrUnlock, kUnit, __LINE__);
         return -1;
     }
     // Closing the only descriptor of the lock file releases the lock, even
     // when close() reports an error.
     int fd = it->second;
-    held.fds.erase(it);
+    held.table.erase(it);
     if (::close(fd) != 0 && errno != EINTR) {
         SetError(kErrUnlock, kUnit, __LINE__);
         return -1;

@@ -2,6 +2,7 @@
 // interface (and so not counted by the test controls).
 #pragma once
 
+#include <cstdint>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -9,6 +10,16 @@
 #include "common/appliance.h"
 
 namespace xavo::core {
+
+// FNV-1a: the string hash's buckets and the test controls' counter slots.
+inline uint32_t HashOf(std::string_view text) {
+    uint32_t h = 2166136261u;
+    for (char c : text) {
+        h ^= static_cast<unsigned char>(c);
+        h *= 16777619u;
+    }
+    return h;
+}
 
 // Closes every named lock this process holds (the test controls' reset).
 void ReleaseNamedLocks();
@@ -21,9 +32,5 @@ void ResetToolTimeLimit();
 // when signal N killed it, or -1 when it could not be started, was stopped
 // at its limit or could not be waited for (*pFailure then says where).
 int32_t RunAndWait(const char *szProgram, const std::vector<std::string> &argv, xavo::platform::Failure *pFailure);
-
-// True when a live (not zombie) process has the given name as its command
-// name (the kernel keeps the first 15 characters).
-bool ProcessAlive(std::string_view name);
 
 }  // namespace xavo::core

@@ -88,6 +88,9 @@ private:
     bool MapBlock();
     bool Launched(const char *szProgram, const std::vector<std::string> &argv, Stdout out);
     Woken WaitReadable(int fd, Clock::time_point until, bool bInterruptible);
+    // Takes the helper's notes until the program's end is known; false when
+    // until passed first.
+    bool AwaitExit(Clock::time_point until);
     void RelayStderr();
     void DrainStderr();
     void TakeExitNote();

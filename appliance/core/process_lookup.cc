@@ -1,76 +1,105 @@
-// ORLICIsProcAlive and the process lookup of the service operations: is a
-// program of a given name running beside us?
+// Is a program of a given name running beside us?  ORLICIsProcAlive, and
+// the daemon lookup of ORLIServiceIsRunning and ORLIServiceStart.
+//
+// The CUPS checks of the printer library ask whether cupsd runs before
+// every look at the queue list.  Looking through /proc costs a few
+// microseconds a process, which on a busy appliance is as much as the
+// lpstat run the check is about; so the daemon found last time is looked
+// at first, and a scan (which reads each process's short name before
+// anything dearer) is made only when that one is gone.
 #include <dirent.h>
 #include <sys/stat.h>
 
+#include <atomic>
 #include <cerrno>
+#include <cstdlib>
 #include <string>
-#include <string_view>
 
 #include "common/text_files.h"
 #include "core/internal.h"
+#include "core/process_lookup.h"
 
 using namespace xavo::platform;
 
 namespace {
 constexpr char kUnit[] = "process";
+}  // namespace
 
-bool IsDigits(const char *sz) {
-    if (*sz == '\0') return false;
-    for (; *sz != '\0'; ++sz) {
-        if (*sz < '0' || *sz > '9') return false;
+namespace xavo::core {
+namespace {
+
+// The kernel keeps 15 characters of a command name.
+constexpr size_t kCommLen = 15;
+
+bool SameMounts(pid_t pid, const struct stat &own) {
+    struct stat mounts {};
+    const std::string ns = "/proc/" + std::to_string(pid) + "/ns/mnt";
+    return ::stat(ns.c_str(), &mounts) == 0 && mounts.st_ino == own.st_ino && mounts.st_dev == own.st_dev;
+}
+
+// "pid (comm) state ...": the name may hold ")" itself, so it ends at the
+// last one.  True for a process of the name that is neither a zombie nor
+// dead.
+bool LiveByStat(pid_t pid, std::string_view name) {
+    std::string stat;
+    const std::string path = "/proc/" + std::to_string(pid) + "/stat";
+    if (ReadTextFile(path.c_str(), &stat) != ReadResult::kOk) return false;
+    size_t open = stat.find('(');
+    size_t close = stat.rfind(')');
+    if (open == std::string::npos || close == std::string::npos || close < open || close + 2 >= stat.size()) {
+        return false;
     }
-    return true;
+    char state = stat[close + 2];
+    return std::string_view(stat).substr(open + 1, close - open - 1) == name && state != 'Z' && state != 'X';
+}
+
+// The cheap first look of a scan: the short name alone.
+bool NamedSo(pid_t pid, std::string_view name) {
+    std::string comm;
+    const std::string path = "/proc/" + std::to_string(pid) + "/comm";
+    if (ReadTextFile(path.c_str(), &comm) != ReadResult::kOk) return false;
+    if (!comm.empty() && comm.back() == '\n') comm.pop_back();
+    return comm == name;
+}
+
+// A daemon counts only when it works on our files: one in another mount
+// namespace (a container, a test sandbox) keeps its own /etc and spool.
+bool Qualifies(pid_t pid, std::string_view name, const struct stat *pOwnMounts) {
+    return LiveByStat(pid, name) && (pOwnMounts == nullptr || SameMounts(pid, *pOwnMounts));
+}
+
+pid_t Scan(std::string_view name, const struct stat *pOwnMounts) {
+    DIR *proc = ::opendir("/proc");
+    if (proc == nullptr) return 0;
+    pid_t found = 0;
+    while (found == 0) {
+        const dirent *e = ::readdir(proc);
+        if (e == nullptr) break;
+        char *end = nullptr;
+        const long pid = std::strtol(e->d_name, &end, 10);
+        if (pid <= 0 || *end != '\0') continue;
+        if (NamedSo(static_cast<pid_t>(pid), name) && Qualifies(static_cast<pid_t>(pid), name, pOwnMounts)) {
+            found = static_cast<pid_t>(pid);
+        }
+    }
+    ::closedir(proc);
+    return found;
 }
 
 }  // namespace
 
-namespace xavo::core {
-
-bool ProcessAlive(std::string_view name) {
-    // The kernel keeps 15 characters of a command name.
-    constexpr size_t kCommLen = 15;
+pid_t FindProcess(std::string_view name, std::atomic<pid_t> *pLastFound) {
     name = name.substr(0, kCommLen);
-    // A service counts as running for the caller only when it works on the
-    // caller's files: a daemon in another mount namespace (a container, a
-    // test sandbox) keeps its own /etc/cups and its own spool, and is no
-    // use to us.
-    // Looking through /proc meets processes we may not inspect (EACCES):
-    // that is no failure of ours, and the caller's errno is left alone.
+    // Processes we may not inspect (EACCES) are no failure of ours, and the
+    // caller's errno is left alone.
     const int savedErrno = errno;
-    struct stat ownMounts {};
-    const bool bKnowOwnMounts = ::stat("/proc/self/ns/mnt", &ownMounts) == 0;
-    DIR *proc = ::opendir("/proc");
-    if (proc == nullptr) return false;
-    bool bFound = false;
-    std::string stat;
-    while (!bFound) {
-        dirent *e = ::readdir(proc);
-        if (e == nullptr) break;
-        if (!IsDigits(e->d_name)) continue;
-        if (bKnowOwnMounts) {
-            struct stat mounts {};
-            std::string ns = std::string("/proc/") + e->d_name + "/ns/mnt";
-            if (::stat(ns.c_str(), &mounts) != 0 || mounts.st_ino != ownMounts.st_ino ||
-                mounts.st_dev != ownMounts.st_dev) {
-                continue;
-            }
-        }
-        std::string path = std::string("/proc/") + e->d_name + "/stat";
-        if (xavo::platform::ReadTextFile(path.c_str(), &stat) != ReadResult::kOk) continue;
-        // "pid (comm) state ...": the name may hold ")" itself, so it ends
-        // at the last one.
-        size_t open = stat.find('(');
-        size_t close = stat.rfind(')');
-        if (open == std::string::npos || close == std::string::npos || close < open || close + 2 >= stat.size()) {
-            continue;
-        }
-        char state = stat[close + 2];
-        bFound = std::string_view(stat).substr(open + 1, close - open - 1) == name && state != 'Z' && state != 'X';
-    }
-    ::closedir(proc);
+    struct stat own {};
+    const struct stat *pOwn = ::stat("/proc/self/ns/mnt", &own) == 0 ? &own : nullptr;
+    pid_t pid = pLastFound != nullptr ? pLastFound->load(std::memory_order_relaxed) : 0;
+    if (pid <= 0 || !Qualifies(pid, name, pOwn)) pid = Scan(name, pOwn);
+    if (pLastFound != nullptr) pLastFound->store(pid, std::memory_order_relaxed);
     errno = savedErrno;
-    return bFound;
+    return pid;
 }
 
 }  // namespace xavo::core
@@ -78,5 +107,5 @@ bool ProcessAlive(std::string_view name) {
 XAVO_PLATFORM_API int32_t ORLICIsProcAlive(const char *szProcName) {
     Counted(__func__);
     if (szProcName == nullptr || szProcName[0] == '\0') return 0;
-    return XAVO_GUARD(int32_t{0}, [&] { return xavo::core::ProcessAlive(szProcName) ? int32_t{1} : int32_t{0}; });
+    return XAVO_GUARD(int32_t{0}, [&] { return xavo::core::FindProcess(szProcName) != 0 ? int32_t{1} : int32_t{0}; });
 }

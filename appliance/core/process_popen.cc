@@ -5,8 +5,6 @@
 // gets the end of the output at the program's time limit (the program is
 // then stopped), and the program's standard error is relayed while the
 // caller reads.
-#include <pthread.h>
-
 #include <cerrno>
 #include <cstdarg>
 #include <cstdio>
@@ -16,6 +14,7 @@
 #include <mutex>
 #include <new>
 
+#include "core/fork_local.h"
 #include "core/internal.h"
 #include "core/process_args.h"
 #include "core/process_child.h"
@@ -45,34 +44,12 @@ int CookieClose(void *pCookie) {
 
 const cookie_io_functions_t kCookieFunctions{CookieRead, nullptr, nullptr, CookieClose};
 
-struct Streams {
-    std::mutex mutex;
-    std::map<FILE *, std::unique_ptr<Child>> children;
-};
-Streams &OpenStreams();
-
 // A child forked by the host has none of its parent's programs for
 // children: it forgets their streams (ORLICPclose must neither wait for nor
 // stop a program of its parent's), without touching them.
-void BeforeFork() { OpenStreams().mutex.lock(); }
-void AfterForkParent() { OpenStreams().mutex.unlock(); }
-void AfterForkChild() {
-    Streams &streams = OpenStreams();
-    for (auto &entry : streams.children) static_cast<void>(entry.second.release());
-    streams.children.clear();
-    streams.mutex.unlock();
-}
-
-Streams &OpenStreams() {
-    static Streams *streams = [] {
-        static Streams s;
-        pthread_atfork(BeforeFork, AfterForkParent, AfterForkChild);
-        return &s;
-    }();
-    return *streams;
-}
-// Registered when the library is loaded, before the host can fork.
-[[maybe_unused]] const bool kForkHandlers = (OpenStreams(), true);
+void ForgetStream(std::pair<FILE *const, std::unique_ptr<Child>> &entry) { static_cast<void>(entry.second.release()); }
+using Streams = xavo::core::ForkLocal<std::map<FILE *, std::unique_ptr<Child>>, ForgetStream>;
+[[maybe_unused]] const bool kForkHandlers = (Streams::Get(), true);
 
 }  // namespace
 
@@ -104,9 +81,9 @@ XAVO_PLATFORM_API FILE *ORLICPopen(const char *szProgram, const char *szMode, ..
             return nullptr;
         }
         try {
-            Streams &streams = OpenStreams();
+            Streams &streams = Streams::Get();
             std::lock_guard guard(streams.mutex);
-            streams.children.emplace(pStream, std::move(child));
+            streams.table.emplace(pStream, std::move(child));
         } catch (...) {
             std::fclose(pStream);
             throw;
@@ -125,15 +102,15 @@ XAVO_PLATFORM_API int32_t ORLICPclose(FILE *pStream) {
     const bool bInjected = XavoStandinEnter(__func__, 1, &uInjected) != 0;
     std::unique_ptr<Child> child;
     {
-        Streams &streams = OpenStreams();
+        Streams &streams = Streams::Get();
         std::lock_guard guard(streams.mutex);
-        auto it = pStream != nullptr ? streams.children.find(pStream) : streams.children.end();
-        if (it == streams.children.end()) {
+        auto it = pStream != nullptr ? streams.table.find(pStream) : streams.table.end();
+        if (it == streams.table.end()) {
             SetError(kErrBadParameters, kUnit, __LINE__);
             return kNotRun;
         }
         child = std::move(it->second);
-        streams.children.erase(it);
+        streams.table.erase(it);
     }
     // Closing first: a program still writing gets EPIPE (or SIGPIPE) and
     // ends instead of blocking on a pipe nobody reads.

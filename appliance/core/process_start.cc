@@ -263,7 +263,7 @@ bool Child::Launched(const char *szProgram, const std::vector<std::string> &argv
         return true;
     }
     // The program ended at once (or never started): nothing to stop.
-    while (!exited_ && WaitReadable(report_.get(), Clock::time_point::max(), false) == Woken::kReady) TakeExitNote();
+    AwaitExit(Clock::time_point::max());
     Finish();
     errno = startError != 0 ? startError : ECHILD;
     return false;

@@ -61,14 +61,16 @@ Child::~Child() {
 }
 
 int32_t Child::Wait() {
+    if (!AwaitExit(deadline_)) Stop();
+    return Finish();
+}
+
+bool Child::AwaitExit(Clock::time_point until) {
     while (!exited_) {
-        if (WaitReadable(report_.get(), deadline_, false) == Woken::kTimeUp) {
-            Stop();
-            break;
-        }
+        if (WaitReadable(report_.get(), until, false) != Woken::kReady) return false;
         TakeExitNote();
     }
-    return Finish();
+    return true;
 }
 
 ssize_t Child::ReadOutput(char *pBuf, size_t cb) {
@@ -160,11 +162,10 @@ void Child::Stop() {
     relay_.Note(kLogStopped);
     stopped_ = true;
     Signal(SIGTERM);
-    const Clock::time_point grace = Clock::now() + kStopGrace;
-    while (!exited_ && WaitReadable(report_.get(), grace, false) == Woken::kReady) TakeExitNote();
+    AwaitExit(Clock::now() + kStopGrace);
     // Also when the program went at SIGTERM: what it started goes too.
     Signal(SIGKILL);
-    while (!exited_ && WaitReadable(report_.get(), Clock::time_point::max(), false) == Woken::kReady) TakeExitNote();
+    AwaitExit(Clock::time_point::max());
     errno = saved;
 }
 

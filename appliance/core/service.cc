@@ -4,8 +4,8 @@
 #include <string>
 #include <vector>
 
-#include "core/daemon_lookup.h"
 #include "core/internal.h"
+#include "core/process_lookup.h"
 
 using namespace xavo::platform;
 
@@ -45,7 +45,9 @@ XAVO_PLATFORM_API int32_t ORLIServiceIsRunning(const char *szService) {
         SetError(kErrBadParameters, kUnit, __LINE__);
         return -1;
     }
-    return XAVO_GUARD(int32_t{-1}, [&] { return xavo::core::FindDaemon(service->process, &service->lastFound) != 0 ? int32_t{1} : int32_t{0}; });
+    return XAVO_GUARD(int32_t{-1}, [&] {
+        return xavo::core::FindProcess(service->process, &service->lastFound) != 0 ? int32_t{1} : int32_t{0};
+    });
 }
 
 // 0 when the service runs already or its start command succeeded (the
@@ -58,7 +60,7 @@ XAVO_PLATFORM_API int32_t ORLIServiceStart(const char *szService, int32_t /*iFla
         return -1;
     }
     return XAVO_GUARD(int32_t{-1}, [&] {
-        if (xavo::core::FindDaemon(service->process, &service->lastFound) != 0) return int32_t{0};
+        if (xavo::core::FindProcess(service->process, &service->lastFound) != 0) return int32_t{0};
         Failure failure;
         if (xavo::core::RunAndWait(service->program, service->argv, &failure) != 0) {
             SetError(failure.code, kUnit, failure.line);

@@ -50,14 +50,7 @@ Control &State() {
     return control;
 }
 
-size_t SlotOf(std::string_view op) {
-    uint32_t h = 2166136261u;  // FNV-1a
-    for (char ch : op) {
-        h ^= static_cast<unsigned char>(ch);
-        h *= 16777619u;
-    }
-    return h % kCounterSlots;
-}
+size_t SlotOf(std::string_view op) { return xavo::core::HashOf(op) % kCounterSlots; }
 
 // The counter of op, or null when the table is full.  Lock-free once the
 // name is in the table; entering a name takes the mutex (the caller must not

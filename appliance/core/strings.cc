@@ -17,8 +17,6 @@ constexpr char kUnit[] = "strings";
 // program output) are kilobytes.
 constexpr int32_t kMinCatAlloc = 256;
 
-bool IsSpace(char c) { return std::isspace(static_cast<unsigned char>(c)) != 0; }
-
 // Appends fields to the list; on failure the list is as it was.
 template <class Split>
 int32_t AppendFields(const char *sz, const char *szDelims, ORLICSzList **ppList, int iLine, Split split) {
@@ -48,12 +46,9 @@ int32_t AppendFields(const char *sz, const char *szDelims, ORLICSzList **ppList,
 XAVO_PLATFORM_API char *ORLICStrTrim(char *sz, int32_t /*iReserved1*/, int32_t /*iReserved2*/) {
     Counted(__func__);
     if (sz == nullptr) return nullptr;
-    size_t len = std::strlen(sz);
-    size_t start = 0;
-    while (start < len && IsSpace(sz[start])) ++start;
-    while (len > start && IsSpace(sz[len - 1])) --len;
-    std::memmove(sz, sz + start, len - start);
-    sz[len - start] = '\0';
+    const std::string_view kept = Trim(sz);
+    std::memmove(sz, kept.data(), kept.size());
+    sz[kept.size()] = '\0';
     return sz;
 }
 

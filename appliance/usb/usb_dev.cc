@@ -9,6 +9,7 @@
 #include <unordered_set>
 #include <vector>
 
+#include "common/temp_files.h"
 #include "common/text_files.h"
 #include "xavousb.h"
 
@@ -70,17 +71,6 @@ bool ParseHexId(const std::string &text, uint32_t *pId) {
     if (*end != '\0') return false;
     *pId = static_cast<uint32_t>(v);
     return true;
-}
-
-void CopyCut(char *szField, size_t cbField, const std::string &text) {
-    size_t n = text.size() < cbField - 1 ? text.size() : cbField - 1;
-    std::memcpy(szField, text.data(), n);
-    szField[n] = '\0';
-}
-
-std::string Parent(const std::string &path) {
-    size_t slash = path.rfind('/');
-    return slash == std::string::npos || slash == 0 ? std::string("/") : path.substr(0, slash);
 }
 
 }  // namespace
@@ -148,8 +138,8 @@ XAVO_PLATFORM_API int32_t XAVOUSBDevGetInfo(const char *szDevName, XAVOUSBDevInf
             SetError(kErrNotFound, kUnit, __LINE__);
             return int32_t{-1};
         }
-        std::string interface = Parent(Parent(real));
-        std::string device = Parent(interface);
+        std::string interface = DirName(DirName(real));
+        std::string device = DirName(interface);
         std::string cls, vendor, product;
         uint32_t uVendor = 0, uProduct = 0;
         if (!ReadAttribute(interface, "bInterfaceClass", &cls) || !ReadAttribute(device, "idVendor", &vendor) ||
@@ -167,9 +157,9 @@ XAVO_PLATFORM_API int32_t XAVOUSBDevGetInfo(const char *szDevName, XAVOUSBDevInf
         pInfo->uKind = cls == kPrinterClass ? kKindPrinter : 0;
         pInfo->uVendorId = uVendor;
         pInfo->uProductId = uProduct;
-        CopyCut(pInfo->szManufacturer, sizeof pInfo->szManufacturer, manufacturer);
-        CopyCut(pInfo->szProduct, sizeof pInfo->szProduct, productName);
-        CopyCut(pInfo->szSerial, sizeof pInfo->szSerial, serial);
+        CopyValue(manufacturer, pInfo->szManufacturer, sizeof pInfo->szManufacturer);
+        CopyValue(productName, pInfo->szProduct, sizeof pInfo->szProduct);
+        CopyValue(serial, pInfo->szSerial, sizeof pInfo->szSerial);
         // The appliance names a printer by vendor, product and serial; a
         // device without a serial number gets no name from us.
         pInfo->szPrinterId[0] = '\0';
