@@ -1,5 +1,5 @@
 // The platform's pure line parsers of its two file forms and its line
-// formatter (appliance/common/text_files): lines split and join back to
+// formatter (appliance/common/text_lines.cc): lines split and join back to
 // the text, parsed parts lie inside their line, and a line formatted from a
 // key and value that the writers accept parses back to them.
 #include <fuzzer/FuzzedDataProvider.h>
