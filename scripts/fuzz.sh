@@ -4,10 +4,14 @@
 #
 #   scripts/fuzz.sh --short     every target for a few seconds (the test command)
 #   scripts/fuzz.sh [--runs N]  every target for N executions, 10 million by
-#                               default (the long run; about an hour or two)
+#                               default (the long run: hours; the file round
+#                               trips cost about a millisecond an execution
+#                               once their corpus holds long files)
 #   scripts/fuzz.sh --record    records the seed corpora again from the real
 #                               tools (fuzz/record_corpus.cc)
 #   FUZZ_TARGETS="a b" limits a run to some targets.
+#   FUZZ_WORKERS=N runs each target of a long run in N processes at once
+#     (libFuzzer's fork mode: one corpus, executions counted together).
 #
 # Inputs that add coverage go to build/fuzz/corpus/<target>, never into the
 # seeds; an input that fails a target is saved under
@@ -28,7 +32,7 @@ case "${1:-}" in
   --record) mode=record ;;
   --runs) runs=${2:?--runs needs a number} ;;
   "") ;;
-  *) sed -n '2,17p' "$0" >&2; exit 2 ;;
+  *) sed -n '2,20p' "$0" >&2; exit 2 ;;
 esac
 
 if [ "$mode" = record ]; then
@@ -49,6 +53,8 @@ if [ "$mode" = short ]; then
   limit=(-max_total_time="$short_seconds")
 else
   limit=(-runs="$runs")
+  workers=${FUZZ_WORKERS:-1}
+  [ "$workers" -gt 1 ] && limit+=(-fork="$workers")
 fi
 status=0
 for t in $targets; do
@@ -73,6 +79,9 @@ for t in $targets; do
     status=1
   fi
   executed=$(sed -n 's/^stat::number_of_executed_units: *//p' "$log" | tail -1)
+  # In fork mode only the parent's progress lines ("#N: cov: ...") count
+  # the executions of all its workers.
+  [ -n "$executed" ] || executed=$(sed -n 's/^#\([0-9]*\): cov:.*/\1/p' "$log" | tail -1)
   echo "fuzz $t: ${executed:-?} executions, $found findings"
   [ "$found" -eq 0 ] || { echo "fuzz $t failed (log: $log):"; grep -E 'ERROR|property failed|SUMMARY' "$log" | head -5; }
 done
