@@ -23,10 +23,14 @@ require_sandbox_host() {
 # packages) are of mostly the same sources: ccache, when installed, keeps a
 # second run of a command, or a run in another clone, to what changed.
 # CMake takes the launcher from the environment; paths are hashed relative
-# to the checkout.
+# to the checkout, and the checkout's own directory is left out of the hash
+# (ccache adds it for builds with debug information): without that, no
+# object of one clone would ever serve another.  The cost: an object taken
+# from another clone names that clone's directory in its debug information.
 use_ccache() {
   if command -v ccache >/dev/null; then
-    export CMAKE_C_COMPILER_LAUNCHER=ccache CMAKE_CXX_COMPILER_LAUNCHER=ccache CCACHE_BASEDIR=$PWD
+    export CMAKE_C_COMPILER_LAUNCHER=ccache CMAKE_CXX_COMPILER_LAUNCHER=ccache \
+           CCACHE_BASEDIR=$PWD CCACHE_NOHASHDIR=1
   fi
 }
 
