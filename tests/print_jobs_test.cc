@@ -1,17 +1,19 @@
 // Printing and jobs: lpr's argument vector, reading lpq listings, cleaning
-// the spool, and a held job against a real CUPS scheduler (the demo
-// walk-through delivers a test page and a file end to end).
+// the spool (a held job against a real scheduler is followed by the
+// command's suite, and the demo walk-through delivers a test page and a
+// file end to end).
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <signal.h>
+#include <spawn.h>
 #include <sys/stat.h>
+#include <sys/wait.h>
 
 #include <functional>
 #include <string>
 #include <vector>
 
 #include "appliance/standin_control.h"
-#include "sandbox/cupsd.h"
 #include "support/cases.h"
 #include "support/fault_sweep.h"
 #include "support/logs.h"
@@ -22,7 +24,6 @@
 using ::testing::AllOf;
 using ::testing::Each;
 using ::testing::ElementsAre;
-using ::testing::HasSubstr;
 using ::testing::IsEmpty;
 using ::testing::SizeIs;
 using ::testing::StartsWith;
@@ -43,11 +44,12 @@ void SetCupsName(const std::string &printerId, const std::string &queue) {
     ORLICSzHashFree(hash);
 }
 
-// A title and removal asked together, and the test page, through the real
-// scheduler and the demo walk-through.
+// lpr is a recorder here; jobs through the real scheduler are followed in
+// the command's suite and the demo walk-through.
 TEST(PrintSubmission, LprGetsExactlyTheOptionsAsked) {
     struct { const char *szName, *szTitle; int32_t blRemove; std::vector<std::string> args; } const cases[] = {
         {"remove only", nullptr, 1, {"-P", kQueue, "-r", "/tmp/doc.pdf"}},
+        {"every option: the vector full", "Payroll", 1, {"-P", kQueue, "-r", "-T", "Payroll", "/tmp/doc.pdf"}},
         {"title only", "t;$(id)", 0, {"-P", kQueue, "-T", "t;$(id)", "/tmp/doc.pdf"}},
         {"remove flag 2 keeps the file", "", 2, {"-P", kQueue, "/tmp/doc.pdf"}},
     };
@@ -253,41 +255,6 @@ TEST(CleanSpool, LprmFailureIsOnlyLoggedButRmFailureFails) {
     EXPECT_THAT(RecordedArgs("rm"), ElementsAre("-rf", std::string(kSpool) + "/job.ps"));
     EXPECT_THAT(Logs(), ElementsAre(StartsWith("3 printer_clean_spool:N lprm all failed. [0x"),
                                     StartsWith("3 printer_clean_spool:N remove /var/services/printer failed. [0x")));
-}
-
-XAVO_SANDBOX_PER_SUITE(RealCups);
-
-class RealCups : public ::testing::Test {
-protected:
-    void SetUp() override { Cupsd::Start(); Cupsd::RemoveAllQueues(); }
-    static void TearDownTestSuite() { Cupsd::Stop(); }
-
-    // A USB-style queue that holds its jobs: disabled, nothing behind it.
-    static std::string StalledQueue() {
-        const std::string name = "stalled";
-        Tool({"/usr/sbin/lpadmin", "-p", name, "-v", "usb://ACME/Model%20100?serial=SN9", "-E"});
-        Tool({"/usr/sbin/cupsdisable", name});
-        SetCupsName("04b8:0005:SN9", name);
-        return "04b8:0005:SN9";
-    }
-    static std::string Listing(const std::string &queue) { return Tool({"/usr/bin/lpq", "-P", queue}); }
-};
-
-TEST_F(RealCups, HeldJobIsListedUntilCancelledAndCarriesItsTitle) {
-    const std::string id = StalledQueue();
-    PlaceFile("/tmp/held.txt", "held job\n");
-    ASSERT_EQ(XAVOPrinterCupsPrintFile(id.c_str(), "/tmp/held.txt", "Payroll", 1), 0);
-    EXPECT_FALSE(FileExists("/tmp/held.txt"));  // lpr took it and removed it
-    const std::string listing = Listing("stalled");
-    EXPECT_THAT(listing, HasSubstr("Payroll"));
-    // lpstat -o stalled: "stalled-<job> root ..."
-    const std::string jobs = Tool({"/usr/bin/lpstat", "-o", "stalled"});
-    ASSERT_THAT(jobs, StartsWith("stalled-"));
-    const std::string job = jobs.substr(8, jobs.find(' ') - 8);
-    EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(id.c_str(), job.c_str()), 1) << listing;
-
-    Tool({"/usr/bin/lprm", "-P", "stalled", job});
-    EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(id.c_str(), job.c_str()), 0) << Listing("stalled");
 }
 
 }  // namespace
