@@ -3,6 +3,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <cstdint>
 #include <cstdio>
 #include <string>
 #include <vector>
@@ -25,6 +26,7 @@ void PlaceStatus(const std::string &szPrinterId, const std::string &content) {
 }
 
 TEST(UsbipLockStatus, AnswersZeroWithTheServicesTextOrFree) {
+    const std::string longest(4084, 'l');  // the longest ID whose status path fits
     struct {
         const char *szPrinterId;
         const char *szStatusFile;  // nullptr: no status file
@@ -36,6 +38,7 @@ TEST(UsbipLockStatus, AnswersZeroWithTheServicesTextOrFree) {
         {kPrinter, "QUEUE=\"q (x)\"\nLOCK=\"Locked by 10.0.0.7\"\n", 64, "Locked by 10.0.0.7"},
         {kPrinter, "QUEUE=\"q (x)\"\n", 64, "Free"},  // no LOCK key
         {"", "LOCK=\"Busy\"\n", 64, "Busy"},          // an empty printer ID reads the bare prefix
+        {longest.c_str(), nullptr, 64, "Free"},
     };
     for (const auto &c : cases) {
         if (c.szStatusFile) PlaceStatus(c.szPrinterId, c.szStatusFile);
@@ -127,46 +130,28 @@ TEST(QueueGet, RewritesTheFirstRemarkToNameTheCupsJobs) {
     }
 }
 
-TEST(QueueGetFailures, UnreadableStatusFailsWithTheLookupsLine) {
-    char szBuf[64];
-    EXPECT_EQ(XAVOPrinterQueueGet(kPrinter, szBuf, sizeof szBuf), -1);
-    PlaceStatus(kPrinter, "LOCK=\"Free\"\n");
-    EXPECT_EQ(XAVOPrinterQueueGet(kPrinter, szBuf, sizeof szBuf), -1);
-    const std::string line = std::string("3 printer_queue_get:N get queue failed, printer=") + kPrinter;
-    EXPECT_THAT(Logs(), ElementsAre(line, line));
+// Calls of the two status readers that fail.  The status file's path is
+// built from the printer ID: one that holds "/" or would be cut to fit the
+// path's buffer is refused, never read (a cut queue-text path, 256 bytes,
+// would read another printer's file).  The queue text logs the failed
+// condition; the lock status logs nothing and takes an empty printer ID,
+// which reads the bare prefix.
+struct FailedRead {
+    const char *szName;
+    int32_t (*reader)(const char *, char *, int32_t);
+    const char *szId;
+    bool bNullBuf;
+    int32_t cbBuf;
+    const char *szStatusFile;  // nullptr: none
+    std::uint32_t uError;      // 0: not checked
+    std::vector<std::string> logs;
+};
+
+std::vector<std::string> Refused(const std::string &condition) {
+    return {"3 printer_queue_get:N Invaild Argument (" + condition + ")=[0]\n"};
 }
 
-// Both status readers refuse bad arguments with ERR_BAD_PARAMETERS: the
-// queue text logs the failed condition, the lock status logs nothing (and
-// takes an empty printer ID, which reads the bare prefix).
-TEST(StatusArguments, BadArgumentsFailWithBadParameters) {
-    char szBuf[16];
-    struct {
-        const char *id;
-        char *buf;
-        int32_t cb;
-        const char *szCondition;
-    } cases[] = {{nullptr, szBuf, 16, "((void *)0) != szPrinterId"}, {"", szBuf, 16, "0 != szPrinterId[0]"},
-                 {kPrinter, nullptr, 16, "((void *)0) != szBuf"}, {kPrinter, szBuf, 0, "0 < cbBuf"}};
-    for (const auto &c : cases) {
-        SCOPED_TRACE(c.szCondition);
-        ORLICErrSetEx(0, "test", 0);
-        EXPECT_EQ(XAVOPrinterQueueGet(c.id, c.buf, c.cb), -1);
-        EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
-        EXPECT_THAT(Logs(), ElementsAre(std::string("3 printer_queue_get:N Invaild Argument (") + c.szCondition +
-                                        ")=[0]\n"));
-        if (c.id != nullptr && c.id[0] == '\0') continue;
-        ORLICErrSetEx(0, "test", 0);
-        EXPECT_EQ(XAVOPrinterUsbipGetLockStatus(c.id, c.buf, c.cb), -1);
-        EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
-        EXPECT_THAT(Logs(), IsEmpty());
-    }
-}
-
-// The status file's path is built from the printer ID: one that holds "/"
-// or would be cut to fit the path's buffer is refused, never read.  A cut
-// queue-text path (256 bytes) would read another printer's file.
-TEST(StatusArguments, PrinterIdThatLeavesTheDirectoryOrIsCutIsRefused) {
+TEST(StatusReaders, FailWithTheirErrorAndLeaveTheBufferAlone) {
     const std::string fitsQueue(244, 'q');  // "/tmp/usbip_" + 244: 255 characters, fits 256 bytes
     // Written in place: the name leaves no room for a temporary file's suffix.
     std::FILE *other = std::fopen(("/tmp/usbip_" + fitsQueue).c_str(), "w");
@@ -174,32 +159,43 @@ TEST(StatusArguments, PrinterIdThatLeavesTheDirectoryOrIsCutIsRefused) {
     std::fputs("QUEUE=\"other printer\"\n", other);
     std::fclose(other);
     xavo::test::PlaceFile("/tmp/usbip_dir/x", "QUEUE=\"elsewhere\"\nLOCK=\"Locked\"\n");
-    const std::string condSlash = "((void *)0) == strchr(szPrinterId, '/')";
-    const std::string condFits = "sizeof(szPath) > snprintf(szPath, sizeof(szPath), \"/tmp/usbip_%s\", szPrinterId)";
-    struct { std::string id; std::string condition; } const queueCases[] = {
-        {"dir/x", condSlash}, {"../tmp/usbip_dir/x", condSlash}, {fitsQueue + "q", condFits}};
-    char szBuf[64];
-    for (const auto &c : queueCases) {
-        ORLICErrSetEx(0, "test", 0);
-        EXPECT_EQ(XAVOPrinterQueueGet(c.id.c_str(), szBuf, sizeof szBuf), -1) << c.id;
-        EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
-        EXPECT_THAT(Logs(), ElementsAre("3 printer_queue_get:N Invaild Argument (" + c.condition + ")=[0]\n"));
-    }
-    ASSERT_EQ(XAVOPrinterQueueGet(fitsQueue.c_str(), szBuf, sizeof szBuf), 0);
-    EXPECT_STREQ(szBuf, "other printer");
-    // The lock status path has 4096 bytes: 4085 characters of ID are one too many.
-    const std::string lockCases[] = {"dir/x", "../tmp/usbip_dir/x", std::string(4085, 'l')};
-    for (const auto &id : lockCases) {
+    const std::string slash = "((void *)0) == strchr(szPrinterId, '/')";
+    const std::string queueGetFailed = std::string("3 printer_queue_get:N get queue failed, printer=") + kPrinter;
+    const std::string cutQueue = fitsQueue + "q", cutLock(4085, 'l');
+    const auto queue = XAVOPrinterQueueGet;
+    const auto lock = XAVOPrinterUsbipGetLockStatus;
+    const FailedRead cases[] = {
+        {"queue: null ID", queue, nullptr, false, 64, nullptr, ERR_BAD_PARAMETERS, Refused("((void *)0) != szPrinterId")},
+        {"queue: empty ID", queue, "", false, 64, nullptr, ERR_BAD_PARAMETERS, Refused("0 != szPrinterId[0]")},
+        {"queue: null buffer", queue, kPrinter, true, 64, nullptr, ERR_BAD_PARAMETERS, Refused("((void *)0) != szBuf")},
+        {"queue: no room", queue, kPrinter, false, 0, nullptr, ERR_BAD_PARAMETERS, Refused("0 < cbBuf")},
+        {"queue: slash", queue, "dir/x", false, 64, nullptr, ERR_BAD_PARAMETERS, Refused(slash)},
+        {"queue: cut path", queue, cutQueue.c_str(), false, 64, nullptr, ERR_BAD_PARAMETERS,
+         Refused("sizeof(szPath) > snprintf(szPath, sizeof(szPath), \"/tmp/usbip_%s\", szPrinterId)")},
+        {"queue: no status file", queue, kPrinter, false, 64, nullptr, 0, {queueGetFailed}},
+        {"queue: no QUEUE key", queue, kPrinter, false, 64, "LOCK=\"Free\"\n", 0, {queueGetFailed}},
+        {"lock: null ID", lock, nullptr, false, 64, nullptr, ERR_BAD_PARAMETERS, {}},
+        {"lock: null buffer", lock, kPrinter, true, 64, nullptr, ERR_BAD_PARAMETERS, {}},
+        {"lock: no room", lock, kPrinter, false, 0, nullptr, ERR_BAD_PARAMETERS, {}},
+        {"lock: slash", lock, "dir/x", false, 64, nullptr, ERR_BAD_PARAMETERS, {}},
+        // The lock status path has 4096 bytes: 4085 characters of ID are one too many.
+        {"lock: cut path", lock, cutLock.c_str(), false, 64, nullptr, ERR_BAD_PARAMETERS, {}},
+    };
+    for (const FailedRead &c : cases) {
+        SCOPED_TRACE(c.szName);
+        if (c.szStatusFile) PlaceStatus(kPrinter, c.szStatusFile);
         ORLICErrSetEx(0, "test", 0);
         std::string buf(64, 'x');
-        EXPECT_EQ(XAVOPrinterUsbipGetLockStatus(id.c_str(), buf.data(), 64), -1) << id.substr(0, 20);
-        EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
+        EXPECT_EQ(c.reader(c.szId, c.bNullBuf ? nullptr : buf.data(), c.cbBuf), -1);
+        if (c.uError != 0) {
+            EXPECT_EQ(ORLICErrGet(), c.uError);
+        }
         EXPECT_EQ(buf, std::string(64, 'x'));
+        EXPECT_EQ(Logs(), c.logs);
     }
-    std::string buf(64, 'x');
-    EXPECT_EQ(XAVOPrinterUsbipGetLockStatus(std::string(4084, 'l').c_str(), buf.data(), 64), 0);
-    EXPECT_STREQ(buf.c_str(), "Free");
-    EXPECT_THAT(Logs(), IsEmpty());
+    char szBuf[64];
+    ASSERT_EQ(XAVOPrinterQueueGet(fitsQueue.c_str(), szBuf, sizeof szBuf), 0);
+    EXPECT_STREQ(szBuf, "other printer");
 }
 
 }  // namespace
