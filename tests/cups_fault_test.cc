@@ -240,7 +240,9 @@ std::vector<std::string> PpdFiles() {
 // A printer ID that holds "/" or a pattern character, or is too long for the
 // copy's path, gets no kept copy: the copy fails as a bad argument, nothing
 // is written anywhere, and the queue is made from the caller's file.
-TEST_F(CupsFaults, PpdCopyIsRefusedForIdsThatCannotNameAKeptCopy) {
+// Without a file from the caller, no copy is looked for under such an ID: a
+// file planted where its path leads is never handed to the queue.
+TEST_F(CupsFaults, PpdCopyIsNeitherKeptNorLookedForUnderIdsThatCannotNameOne) {
     const std::string kName = "((void *)0) == strpbrk(szPrinterId, \"/*?[\")";
     const std::string kFits =
         "sizeof(szDest) > snprintf(szDest, sizeof(szDest), \"/etc/cups/ppd/%s.ppd\", szPrinterId)";
@@ -254,17 +256,19 @@ TEST_F(CupsFaults, PpdCopyIsRefusedForIdsThatCannotNameAKeptCopy) {
     };
     RecordQueueCreation();
     PlaceFile("/tmp/new.ppd", "*PPD-Adobe: \"4.3\"\n");
-    PlaceFile("/etc/cups/ppd/04b8:0005:SN0001.ppd", "OTHER PRINTER");
-    PlaceFile("/etc/cups/ppd/10.0.0.5-office.ppd", "OFFICE");
+    const std::vector<std::string> kPlanted = {"/etc/cups/ppd/04b8:0005:SN0001.ppd", "/etc/cups/ppd/10.0.0.5-office.ppd",
+                                               "/etc/cups/ppd/04b8:0005:SN*.ppd", "/tmp/stolen.ppd"};
+    for (const std::string &path : kPlanted) PlaceFile(path, "PLANTED");
     PlaceFile("/etc/cups/ppd/04b8:0005:x/placeholder", "");
     const std::vector<std::string> before = PpdFiles();
     for (const auto &c : cases) {
         SCOPED_TRACE(c.id.substr(0, 40));
         NetPrinterConf conf = NetRecord("10.0.0.5", "of?ice", "socket");
-        const int32_t result =
-            c.bNet ? XAVOPrinterNetCupsAdd(&conf, "/tmp/new.ppd") : XAVOPrinterCupsAdd(c.id.c_str(), "/tmp/new.ppd");
-        EXPECT_EQ(result, 0);
-        EXPECT_THAT(Runs().front(), EndsWith(" -P /tmp/new.ppd"));
+        for (const char *szPpd : {"/tmp/new.ppd", static_cast<const char *>(nullptr)}) {
+            EXPECT_EQ(c.bNet ? XAVOPrinterNetCupsAdd(&conf, szPpd) : XAVOPrinterCupsAdd(c.id.c_str(), szPpd), 0);
+            EXPECT_THAT(Runs().front(), szPpd ? Matcher<std::string>(EndsWith(" -P /tmp/new.ppd"))
+                                              : Matcher<std::string>(Not(HasSubstr(" -P "))));
+        }
         const std::string unit = c.bNet ? "printer_net_cups_add" : "printer_cups_printer_add";
         const std::string refused = "3 printer_backup_ppd:N Invaild Argument (" + c.condition + ")=[0]\n";
         const std::string failed =
@@ -272,27 +276,12 @@ TEST_F(CupsFaults, PpdCopyIsRefusedForIdsThatCannotNameAKeptCopy) {
         EXPECT_THAT(Logs(), IsSupersetOf<std::vector<Matcher<std::string>>>({Eq(refused), StartsWith(failed)}));
         EXPECT_EQ(PpdFiles(), before);
     }
-    EXPECT_EQ(ReadFile("/etc/cups/ppd/04b8:0005:SN0001.ppd"), "OTHER PRINTER");
-    EXPECT_EQ(ReadFile("/etc/cups/ppd/10.0.0.5-office.ppd"), "OFFICE");
-    // The longest ID whose copy fits is still kept.
+    for (const std::string &path : kPlanted) EXPECT_EQ(ReadFile(path), "PLANTED") << path;
+    // The longest ID whose copy fits is still kept, and serves the next creation.
     const std::string fits = "04b8:0005:" + std::string(227, 'L');
     EXPECT_EQ(XAVOPrinterCupsAdd(fits.c_str(), "/tmp/new.ppd"), 0);
     EXPECT_EQ(ReadFile("/etc/cups/ppd/" + fits + ".ppd"), "*PPD-Adobe: \"4.3\"\n");
-}
-
-// Without a file from the caller, a kept copy is looked for only under an ID
-// the library would keep one under: a file planted where the ID's path
-// leads is never handed to the queue.
-TEST_F(CupsFaults, KeptCopyIsNotLookedForUnderAnIdThatCannotNameOne) {
-    RecordQueueCreation();
-    PlaceFile("/etc/cups/ppd/04b8:0005:SN*.ppd", "PLANTED");
-    PlaceFile("/etc/cups/ppd/04b8:0005:x/placeholder", "");
-    PlaceFile("/tmp/planted.ppd", "PLANTED");
-    for (const char *szId : {"04b8:0005:SN*", "04b8:0005:x/../../../../tmp/planted"}) {
-        EXPECT_EQ(XAVOPrinterCupsAdd(szId, nullptr), 0);
-        EXPECT_THAT(Runs().front(), Not(HasSubstr(" -P "))) << szId;
-    }
-    PlaceFile("/etc/cups/ppd/04b8:0005:SN0001.ppd", "KEPT");
-    EXPECT_EQ(XAVOPrinterCupsAdd(kA, nullptr), 0);
-    EXPECT_THAT(Runs().front(), EndsWith(" -P /etc/cups/ppd/04b8:0005:SN0001.ppd"));
+    Runs();
+    EXPECT_EQ(XAVOPrinterCupsAdd(fits.c_str(), nullptr), 0);
+    EXPECT_THAT(Runs().front(), EndsWith(" -P /etc/cups/ppd/" + fits + ".ppd"));
 }
