@@ -2,8 +2,9 @@
 // run ends within its time limit together with what it started, the
 // programs' standard error goes to syslog instead of the caller's terminal,
 // only the appliance's own file name pattern is expanded, arguments reach
-// the program as given, the child gets /dev/null for input and the C
-// locale, and a caller's SIGCHLD handling never changes a result.
+// the program as given, and the child gets /dev/null for input and the C
+// locale.  What a caller's SIGCHLD handling may not change is proven
+// through every entry point by the child-hygiene proof.
 #include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -196,29 +197,6 @@ TEST(RunnerPatterns, OnlyTheSpoolPatternOfRmIsExpanded) {
     EXPECT_TRUE(FileExists("/var/services/printer/.hidden"));
     EXPECT_EQ(ORLICExec("/bin/rm", "-rf", "/var/services/printer/*.*", nullptr, nullptr), 0)
         << "nothing matches: rm -f of the pattern's own name";
-}
-
-// A caller that ignores SIGCHLD, reaps every child in its handler, or
-// blocks SIGCHLD gets each run's own result, and its handler is never run
-// for the runner's programs, only for its own children.
-TEST(RunnerSigchld, CallersHandlingOfSigchldNeverChangesAResult) {
-    PlaceProgram(kTool, "#!/bin/sh\n[ -z \"$2\" ] || echo \"$1\"\nsleep 0.05\nexit \"$1\"\n");
-    for (const SigchldSetting &s : kSigchldSettings) {
-        {
-            SigchldScope scope(s);
-            for (int i = 0; i < 3; ++i) {
-                EXPECT_EQ(ORLICExec(kTool, "0", nullptr, nullptr, nullptr), 0) << s.szName;
-                EXPECT_EQ(ORLICExec(kTool, "3", nullptr, nullptr, nullptr), 3) << s.szName;
-                FILE *stream = ORLICPopen(kTool, "r", "5", "print", nullptr);
-                ASSERT_NE(stream, nullptr);
-                EXPECT_EQ(ReadAll(stream), "5\n") << s.szName;
-                EXPECT_EQ(ORLICPclose(stream), 5) << s.szName;
-            }
-        }
-        // Only for its own child.
-        EXPECT_EQ(gReapingHandlerCalls, s.handler == ReapEveryChild ? 1 : 0) << s.szName;
-        EXPECT_THAT(Descendants(), IsEmpty()) << s.szName;
-    }
 }
 
 TEST(RunnerStart, ProgramThatCannotBeStartedFailsAtOnceWithItsReason) {

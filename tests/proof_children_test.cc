@@ -112,6 +112,9 @@ void SigchldSettings(Tally *pTally) {
             SigchldScope scope(s);
             for (int round = 0; round < 3; ++round) RunMix(pTally, s.szName);
         }
+        // A caller's handler runs for its own child only, never for a tool.
+        pTally->Check(gReapingHandlerCalls == (s.handler == ReapEveryChild ? 1 : 0),
+                      std::string(s.szName) + ": the handler ran " + std::to_string(gReapingHandlerCalls) + " times");
         pTally->Check(NothingLeft(), std::string(s.szName) + ": a process or zombie left");
     }
 }
