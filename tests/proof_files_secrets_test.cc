@@ -122,8 +122,6 @@ TEST(FileSecretProofs, SecretsNeverShowInClearAndDamagedOnesNeverOpen) {
     for (const LogLine &line : TakeLogs()) {
         EXPECT_TRUE(tally.Check(!HoldsCanary(line.message))) << line.message;
     }
-    tally.Print();
-    EXPECT_EQ(tally.failed, 0);
 }
 
 }  // namespace
