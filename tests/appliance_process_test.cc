@@ -57,19 +57,16 @@ std::string ReadAll(FILE *stream) {
     }
 }
 
-// Each way of running a program, reduced to "result, output read".
+// The two ways a run is waited for, reduced to "result, output read":
+// ORLICExecl and ORLICExecv wait as ORLICExec does (one runner under the
+// three), and every entry point is run through the library by the
+// child-hygiene proof.
 struct EntryPoint {
     const char *szName;
     std::function<int32_t(std::string *)> run;
 };
 const EntryPoint kEntryPoints[] = {
     {"ORLICExec", [](std::string *) { return ORLICExec(kTool, "a", nullptr, nullptr, nullptr); }},
-    {"ORLICExecl", [](std::string *) { return ORLICExecl(kTool, 0xBB, "a", nullptr); }},
-    {"ORLICExecv",
-     [](std::string *) {
-         char *const argv[] = {const_cast<char *>(kTool), const_cast<char *>("a"), nullptr};
-         return ORLICExecv(kTool, argv, 1);
-     }},
     {"ORLICPopen",
      [](std::string *pOut) {
          FILE *stream = ORLICPopen(kTool, "r", "a", nullptr);
@@ -113,7 +110,7 @@ TEST(RunnerTimeLimit, EveryEntryPointStopsTheToolAndWhatItStartedAtTheLimit) {
         pthread_sigmask(SIG_SETMASK, &all, &old);
         const auto start = std::chrono::steady_clock::now();
         std::string out;
-        const int32_t result = kEntryPoints[3].run(&out);
+        const int32_t result = kEntryPoints[1].run(&out);
         const double seconds = Since(start);
         pthread_sigmask(SIG_SETMASK, &old, nullptr);
         EXPECT_EQ(result, -1);
