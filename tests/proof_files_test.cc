@@ -1,7 +1,6 @@
 // Proofs for the files the library keeps through the platform: many
 // processes writing at once lose nothing, and writers killed at any moment
 // leave each file whole and at most one temporary file behind.
-#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <sys/wait.h>
@@ -184,15 +183,6 @@ constexpr char kCupsWith[] =
     "<Printer office>\nDeviceURI socket://10.0.0.5\n</Printer>\n"
     "<Printer usbprinter1>\nDeviceURI usb:/dev/usb/lp0\n</Printer>\n";
 
-// The scheduler's file put back with its USB queue, in one step, by the test.
-void PlaceCupsWith() {
-    const char *szNext = "/etc/cups/printers.conf.proof";
-    const int fd = open(szNext, O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0600);
-    if (fd < 0 || write(fd, kCupsWith, sizeof kCupsWith - 1) != static_cast<ssize_t>(sizeof kCupsWith - 1)) _exit(3);
-    close(fd);
-    rename(szNext, kCupsConf);
-}
-
 const Target kTargets[] = {
     {"printer configuration", kConf, "/usr/xavo/etc", ".printer.conf.",
      [](int v) {
@@ -215,7 +205,9 @@ const Target kTargets[] = {
      }},
     {"CUPS printers.conf edit", kCupsConf, "/etc/cups", "printers.conf.",
      [](int v) {
-         if (v == 0) PlaceCupsWith();
+         // Version 0 is the test's own, put back in one step with its USB
+         // queue (by rename, like the library's writes).
+         if (v == 0) PlaceFile(kCupsConf, kCupsWith);
          else XAVOPrinterCupsUsbConfRmAll();
      }},
 };
