@@ -127,8 +127,6 @@ TEST(FileTrustProofs, SymlinkTargetsAreNeverWritten) {
             }
         }
     }
-    tally.Print();
-    EXPECT_EQ(tally.failed, 0);
 }
 
 // ---- untrusted files in /tmp ------------------------------------------------
@@ -216,8 +214,6 @@ TEST(FileTrustProofs, TablePlantedInTmpIsIgnoredAndReplacedByRootsOwn) {
     char status[64] = {};
     EXPECT_TRUE(tally.Check(XAVOPrinterUsbipGetLockStatus(kPrinter, status, sizeof status) == 0 &&
                             std::string(status) == "Free"));
-    tally.Print();
-    EXPECT_EQ(tally.failed, 0);
 }
 
 }  // namespace

@@ -59,54 +59,39 @@ inline std::vector<std::string_view> SplitAtNewlines(std::string_view text) {
     return lines;
 }
 
-// A line that is neither blank, nor a header, nor "key = value" is one the
+// Every line of a file checked the way its reader reads it: lines before
+// any header hold keys of topKeys (a table is nothing but such lines), and a
+// header opens one of the sections when the file has sections at all.  A
+// line that is neither blank, nor a header, nor "key = value" is one the
 // writers never make; nor is a comment or a carriage return (a reader that
 // splits lines there would see a line of its own).
-inline void CheckLine(std::string_view line, const char *szFile, std::vector<std::string> *pFound) {
-    if (line.find('\r') != std::string_view::npos) pFound->push_back(std::string(szFile) + ": carriage return");
-    if (!line.empty() && (line[0] == '#' || line[0] == ';')) pFound->push_back(std::string(szFile) + ": comment");
-}
-
-inline void CheckSectionFile(const char *szFile, const std::map<std::string, const Keys *> &allowed,
-                             std::vector<std::string> *pFound) {
-    std::set<std::string> sections, keys;
-    const Keys *pKeys = nullptr;
+inline void CheckFile(const char *szFile, const Keys &topKeys, const std::map<std::string, const Keys *> &sections,
+                      std::vector<std::string> *pFound) {
+    std::set<std::string> names, keys;
+    const Keys *pKeys = &topKeys;
     const std::string text = ReadFile(szFile);
     const std::string file = szFile;
     for (std::string_view raw : SplitAtNewlines(text)) {
         const std::string_view line = TrimBlanks(raw);
-        CheckLine(line, szFile, pFound);
+        if (line.find('\r') != std::string_view::npos) pFound->push_back(file + ": carriage return");
+        if (!line.empty() && (line[0] == '#' || line[0] == ';')) pFound->push_back(file + ": comment");
         if (line.empty() || line[0] == '#' || line[0] == ';') continue;
+        const bool bHeaderLike = !sections.empty() && line[0] == '[';
         const size_t close = line.rfind(']');
-        if (line[0] == '[' && close != std::string_view::npos && close > 0) {
+        if (bHeaderLike && close != std::string_view::npos && close > 0) {
             const std::string name(line.substr(1, close - 1));
-            auto it = allowed.find(name);
-            if (it == allowed.end() || !sections.insert(name).second) pFound->push_back(file + ": section " + name);
-            pKeys = it == allowed.end() ? nullptr : it->second;
+            auto it = sections.find(name);
+            if (it == sections.end() || !names.insert(name).second) pFound->push_back(file + ": section " + name);
+            pKeys = it == sections.end() ? nullptr : it->second;
             keys.clear();
             continue;
         }
         const size_t eq = line.find('=');
         const std::string key(TrimBlanks(line.substr(0, eq)));
-        if (line[0] == '[' || eq == std::string_view::npos) {
+        if (bHeaderLike || eq == std::string_view::npos) {
             pFound->push_back(file + ": line " + std::string(line.substr(0, 60)));
         } else if (pKeys == nullptr || pKeys->count(key) == 0 || !keys.insert(key).second) {
             pFound->push_back(file + ": key " + key.substr(0, 60));
-        }
-    }
-}
-
-inline void CheckKeyValueFile(const char *szFile, const Keys &allowed, std::vector<std::string> *pFound) {
-    Keys keys;
-    const std::string text = ReadFile(szFile);
-    for (std::string_view raw : SplitAtNewlines(text)) {
-        const std::string_view line = TrimBlanks(raw);
-        CheckLine(line, szFile, pFound);
-        if (line.empty() || line[0] == '#') continue;
-        const size_t eq = line.find('=');
-        const std::string key(TrimBlanks(line.substr(0, eq)));
-        if (eq == std::string_view::npos || allowed.count(key) == 0 || !keys.insert(key).second) {
-            pFound->push_back(std::string(szFile) + ": line " + std::string(line.substr(0, 60)));
         }
     }
 }
@@ -124,10 +109,10 @@ inline std::vector<std::string> UsbipFiles() {
 
 inline std::vector<std::string> Injections(const Expected &expected) {
     std::vector<std::string> found;
-    CheckSectionFile(kConf, expected.sections, &found);
-    CheckSectionFile(kSmbConf, {{"printers", &kSmbShareKeys}}, &found);
-    CheckKeyValueFile(kNptab, expected.nptabKeys, &found);
-    CheckKeyValueFile(kUsbtab, expected.usbtabKeys, &found);
+    CheckFile(kConf, {}, expected.sections, &found);
+    CheckFile(kSmbConf, {}, {{"printers", &kSmbShareKeys}}, &found);
+    CheckFile(kNptab, expected.nptabKeys, {}, &found);
+    CheckFile(kUsbtab, expected.usbtabKeys, {}, &found);
     for (const std::string &path : UsbipFiles()) found.push_back(path + ": written");
     return found;
 }
