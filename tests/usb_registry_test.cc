@@ -18,7 +18,6 @@
 #include "support/fault_sweep.h"
 #include "support/logs.h"
 #include "support/paths.h"
-#include "support/processes.h"
 #include "support/sections.h"
 #include "xavoprinter.h"
 
@@ -193,16 +192,6 @@ TEST(UsbPrinterPlugIn, SerialThatWouldMakeAPathOrPatternStillRegisters) {
         EXPECT_EQ(XAVOPrinterEnableExt(1, "lp0", "1-1"), 0) << szSerial;
         EXPECT_EQ(ReadSection(kConf, std::string("04b8:0005:") + szSerial).at("mode"), "usbip") << szSerial;
     }
-}
-
-TEST(UsbPrinterPlugIn, TwoProcessesPluggingAtOnceBothGetLineAndSection) {
-    Plug("lp0", "1-1", "SN0001");
-    Plug("lp1", "1-2", "SN0002");
-    RunAtOnce(2, [](int i) { return XAVOPrinterEnableExt(1, i ? "lp1" : "lp0", i ? "1-2" : "1-1") == 0; });
-    const std::string table = ReadFile(kUsbtab);
-    EXPECT_TRUE(table == "lp0=\"1-1\"\nlp1=\"1-2\"\n" || table == "lp1=\"1-2\"\nlp0=\"1-1\"\n") << table;
-    EXPECT_EQ(ReadSection(kConf, "04b8:0005:SN0001").at("mode"), "usbip");
-    EXPECT_EQ(ReadSection(kConf, "04b8:0005:SN0002").at("mode"), "usbip");
 }
 
 // Each failing platform call gives -1 and its code, or is survived (an unreadable section is written anew, an
