@@ -214,7 +214,14 @@ TEST(UsbPrinterPlatformFailures, EnableAndRemovalFailCleanly) {
         EXPECT_TRUE(NoLockLeft());
         EXPECT_EQ(GetUsblp("lp0").openNow, 0);
     };
-    SweepFailures([] { Plug("lp0", "1-1"); }, [] { return XAVOPrinterEnableExt(1, "lp0", "1-1"); }, check);
+    // A section kept from an earlier plug-in: the setup rewrites it, so that
+    // every platform call of the section's merge and rewrite is failed too.
+    SweepFailures(
+        [] {
+            Plug("lp0", "1-1");
+            WriteSection(kConf, kPrinter, {{"mode", "lpr"}, {"driver", "x.ppd"}});
+        },
+        [] { return XAVOPrinterEnableExt(1, "lp0", "1-1"); }, check);
     SweepFailures([] { PlaceFile(kUsbtab, "lp0=\"1-1\"\nlp1=\"1-1.2\"\n"); },
                   [] { return XAVOPrinterEnableExt(0, nullptr, "1-1"); }, check);
 }
