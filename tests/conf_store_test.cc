@@ -8,7 +8,6 @@
 #include <map>
 #include <string>
 
-#include "support/fault_sweep.h"
 #include "support/logs.h"
 #include "support/paths.h"
 #include "support/records.h"
@@ -122,32 +121,6 @@ TEST(PrinterCupsNameGet, BadArgumentsFailSilentlyWithBadParameters) {
         EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
     }
     EXPECT_THAT(Logs(), IsEmpty());
-}
-
-// Every platform call of a setup failed in turn: the setup fails cleanly
-// (its own code or the platform's), or carries on where a failure is
-// harmless, and never leaves the printer lock held.
-TEST(PrinterConfSetup, EachPlatformFailureFailsCleanly) {
-    xavo::test::SweepFailures(
-        [] { WriteSection(kPrinter, kStored); },
-        [] {
-            UsbPrinterConf conf = UsbRecord(kPrinter);
-            std::strcpy(conf.szProducer, "New");
-            return XAVOPrinterConfSetup(&conf, 0);
-        },
-        [](const std::string &failed, int32_t result) {
-            if (failed == "ORLICFileGetSection" || failed == "ORLICFileLockByFile") {
-                // An unreadable old section is set up from the record alone;
-                // a busy lock is tried again.
-                EXPECT_EQ(result, 0);
-            } else {
-                EXPECT_LT(result, 0);
-                EXPECT_THAT(ORLICErrGet(), ::testing::AnyOf(xavo::test::kInjectedCode, ERR_OUT_OF_MEMORY));
-            }
-            int fd = XAVOPrinterPrinterConfLock();
-            EXPECT_GE(fd, 0) << "the printer lock was left held";
-            XAVOPrinterPrinterConfUnlock(fd);
-        });
 }
 
 }  // namespace

@@ -116,18 +116,15 @@ std::pair<std::string, std::string> Detect(const std::string &id) {
     return {conf.szBrand, conf.szModel};
 }
 
-struct WalkCase {
-    std::string id, brand, model;
-};
-void ExpectWalks(const std::vector<WalkCase> &cases) {
-    for (const WalkCase &c : cases) EXPECT_EQ(Detect(c.id), std::make_pair(c.brand, c.model)) << c.id.substr(0, 80);
-}
-
 // The first MFG/MANUFACTURER and MDL/MODEL pairs with a value give brand
-// and model, cut to their fields; keys match exactly, values run to ';'.
-TEST(ModelDetect, TakesTheFirstPairOfEachItemExactly) {
+// and model, cut to their fields; keys match exactly, values run to ';'.  A
+// key is everything up to the next ":", so a ";" before it belongs to the
+// key: "CLS;MDL" names no model, and the walk goes on after its value.
+TEST(ModelDetect, TakesTheFirstPairOfEachItemWithKeysRunningToTheNextColon) {
     const std::string brand(300, 'b'), model(2000, 'm');  // longer than a pair's value may be
-    ExpectWalks({
+    const struct {
+        std::string id, brand, model;
+    } cases[] = {
         {"MFG:ACME;MDL:Model 100;CMD:PCL;MANUFACTURER:B;MODEL:Second;", "ACME", "Model 100"},
         {"MANUFACTURER:Long Form;MODEL:M 2", "Long Form", "M 2"},
         {"mfg:ACME; MDL:X;", "keep", "keep"},
@@ -135,13 +132,6 @@ TEST(ModelDetect, TakesTheFirstPairOfEachItemExactly) {
         {":novalue;MDL:;MODEL:Later;MFG:M", "M", "Later"},
         {"garbage without pairs", "keep", "keep"},
         {"MFG:" + brand + ";MDL:" + model + ";", brand.substr(0, 127), model.substr(0, 127)},
-    });
-}
-
-// A key is everything up to the next ":", so a ";" before it belongs to the
-// key: "CLS;MDL" names no model, and the walk goes on after its value.
-TEST(ModelDetect, KeyRunsToTheNextColonThroughSemicolons) {
-    ExpectWalks({
         {"CLS;MDL:X;MFG:ACME;", "ACME", "keep"},
         {"CLS;MFG:X;MDL:Y;", "keep", "Y"},
         {";MDL:X;MODEL:Z;", "keep", "Z"},
@@ -150,7 +140,8 @@ TEST(ModelDetect, KeyRunsToTheNextColonThroughSemicolons) {
         {"A;B;C;MFG:;MANUFACTURER:E;", "E", "keep"},
         {"CLS;MDL:X;", "keep", "keep"},
         {"X;Y;Z;", "keep", "keep"},
-    });
+    };
+    for (const auto &c : cases) EXPECT_EQ(Detect(c.id), std::make_pair(c.brand, c.model)) << c.id.substr(0, 80);
 }
 
 TEST(ModelDetect, MissingOrEmptyStringIdFailsWithErrExec) {

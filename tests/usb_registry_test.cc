@@ -18,7 +18,6 @@
 #include "support/fault_sweep.h"
 #include "support/logs.h"
 #include "support/paths.h"
-#include "support/processes.h"
 #include "support/sections.h"
 #include "xavoprinter.h"
 
@@ -195,16 +194,6 @@ TEST(UsbPrinterPlugIn, SerialThatWouldMakeAPathOrPatternStillRegisters) {
     }
 }
 
-TEST(UsbPrinterPlugIn, TwoProcessesPluggingAtOnceBothGetLineAndSection) {
-    Plug("lp0", "1-1", "SN0001");
-    Plug("lp1", "1-2", "SN0002");
-    RunAtOnce(2, [](int i) { return XAVOPrinterEnableExt(1, i ? "lp1" : "lp0", i ? "1-2" : "1-1") == 0; });
-    const std::string table = ReadFile(kUsbtab);
-    EXPECT_TRUE(table == "lp0=\"1-1\"\nlp1=\"1-2\"\n" || table == "lp1=\"1-2\"\nlp0=\"1-1\"\n") << table;
-    EXPECT_EQ(ReadSection(kConf, "04b8:0005:SN0001").at("mode"), "usbip");
-    EXPECT_EQ(ReadSection(kConf, "04b8:0005:SN0002").at("mode"), "usbip");
-}
-
 // Each failing platform call gives -1 and its code, or is survived (an unreadable section is written anew, an
 // unreadable table has nothing to remove, a busy lock is tried again, a failed release is logged and released once
 // more); none leaves a lock held or the device open.
@@ -225,7 +214,14 @@ TEST(UsbPrinterPlatformFailures, EnableAndRemovalFailCleanly) {
         EXPECT_TRUE(NoLockLeft());
         EXPECT_EQ(GetUsblp("lp0").openNow, 0);
     };
-    SweepFailures([] { Plug("lp0", "1-1"); }, [] { return XAVOPrinterEnableExt(1, "lp0", "1-1"); }, check);
+    // A section kept from an earlier plug-in: the setup rewrites it, so that
+    // every platform call of the section's merge and rewrite is failed too.
+    SweepFailures(
+        [] {
+            Plug("lp0", "1-1");
+            WriteSection(kConf, kPrinter, {{"mode", "lpr"}, {"driver", "x.ppd"}});
+        },
+        [] { return XAVOPrinterEnableExt(1, "lp0", "1-1"); }, check);
     SweepFailures([] { PlaceFile(kUsbtab, "lp0=\"1-1\"\nlp1=\"1-1.2\"\n"); },
                   [] { return XAVOPrinterEnableExt(0, nullptr, "1-1"); }, check);
 }
@@ -270,10 +266,6 @@ TEST_F(LongSerialPrinter, IsListedUnderItsSectionsNameAndGetsItsQueue) {
     ORLICSzList *list = nullptr;
     ASSERT_EQ(XAVOPrinterEnumCount(XAVO_PRINTER_TYPE_USB, &list), 1);
     const std::vector<std::string> listed = Items(list);
-    ORLICSzListFree(list);
-    list = ORLICSzListAlloc(8);
-    ASSERT_EQ(XAVOPrinterProcUsbtabIdEnum(&list), 0);
-    EXPECT_EQ(Items(list), listed);
     ORLICSzListFree(list);
     ASSERT_THAT(listed, ElementsAre(id));
 
