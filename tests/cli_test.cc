@@ -22,6 +22,7 @@
 #include "support/cli_run.h"
 
 using ::testing::AllOf;
+using ::testing::ContainsRegex;
 using ::testing::Eq;
 using ::testing::HasSubstr;
 using ::testing::Not;
@@ -173,6 +174,9 @@ TEST(Cli, SecretsThatWouldBeStoredEmptyOrCutAreRefusedBeforeAnythingIsWritten) {
         std::string secret = c.input.substr(0, c.input.find_first_of("\r\n"));
         EXPECT_EQ(nlohmann::json::parse(get.out)["secret"], secret);
         EXPECT_EQ(nlohmann::json::parse(Cli({"cloud", "get", "--json"}).out)["secret"], nullptr);
+        // show names the secret's key but never its enciphered value.
+        EXPECT_THAT(Cli({"show", "Google Cloud Print"}).out,
+                    ContainsRegex("key=(google pass|refresh token)  value=\\(none\\)"));
     }
 }
 
