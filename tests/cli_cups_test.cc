@@ -7,7 +7,6 @@
 
 #include <cstdio>
 #include <map>
-#include <set>
 #include <string>
 #include <vector>
 
@@ -15,6 +14,8 @@
 #include "sandbox/sandbox.h"
 #include "support/cli_run.h"
 
+using ::testing::AllOf;
+using ::testing::ContainsRegex;
 using ::testing::HasSubstr;
 using ::testing::Not;
 using ::testing::StartsWith;
@@ -38,19 +39,8 @@ protected:
         if (FileExists("/sys/class/usbmisc/lp0")) UnplugUsbDevice("lp0");
         PlaceFile("/tmp/letter.txt", "Dear printer,\n");
     }
-    static void TearDownTestSuite() {
-        pid_t pid = Cupsd::Pid();
-        Cupsd::Stop();
-        if (pid > 0) waitpid(pid, nullptr, 0);
-    }
+    static void TearDownTestSuite() { Cupsd::Stop(); }
 
-    // The USB printer registered with its queue, left disabled so that
-    // jobs stay listed.
-    static void UsbPrinterWithQueue() {
-        PlugUsbDevice({});
-        ASSERT_EQ(Cli({"usb", "enable", "lp0", "1-1"}).status, 0);
-        ASSERT_EQ(Cli({"queue", "add", kUsbId}).status, 0);
-    }
     // A run with --json, its exit status and the output's shape checked.
     static CliRun JsonRun(const std::vector<std::string> &args, int wantStatus, const std::string &input = "") {
         std::vector<std::string> withJson = args;
@@ -63,13 +53,8 @@ protected:
     static Json JsonOf(const std::vector<std::string> &args, int wantStatus) {
         return Json::parse(JsonRun(args, wantStatus).out);
     }
-    static std::string QueueState(const std::string &id) {
-        const Json list = JsonOf({"list"}, 0);
-        for (const Json &p : list["printers"]) {
-            if (p["id"] == id) return p["queue_state"].is_null() ? "null" : p["queue_state"].get<std::string>();
-        }
-        return "no such printer";
-    }
+    // The queue state that list gives for the only printer registered.
+    static Json QueueState() { return JsonOf({"list"}, 0)["printers"][0]["queue_state"]; }
 };
 
 TEST_F(CliCups, ListShowsEachPrintersQueueAndItsStateAndTheUsbipLock) {
@@ -80,11 +65,10 @@ TEST_F(CliCups, ListShowsEachPrintersQueueAndItsStateAndTheUsbipLock) {
     EXPECT_EQ(before[0], (Json{{"id", kUsbId}, {"kind", "usb"}, {"cups_queue", nullptr}, {"queue_state", nullptr},
                                {"usbip_lock", "Free"}}));
     ASSERT_EQ(Cli({"queue", "add", kUsbId}).status, 0);
-    EXPECT_EQ(QueueState(kUsbId), "disabled");
     ASSERT_EQ(Cli({"queue", "enable", "usbprinter1"}).status, 0);
-    EXPECT_EQ(QueueState(kUsbId), "enabled");
+    EXPECT_EQ(QueueState(), "enabled");
     Tool({"/usr/sbin/lpadmin", "-x", "usbprinter1"});
-    EXPECT_EQ(QueueState(kUsbId), "missing");
+    EXPECT_EQ(QueueState(), "missing");
     // Its own questions to CUPS never reach the terminal.
     const CliRun text = Cli({"list"});
     EXPECT_THAT(text.out, HasSubstr("id=04b8:0005:SN0001  kind=usb  cups_queue=usbprinter1  queue_state=missing  "
@@ -93,7 +77,10 @@ TEST_F(CliCups, ListShowsEachPrintersQueueAndItsStateAndTheUsbipLock) {
 }
 
 TEST_F(CliCups, PrintGivesEachJobAUniqueHandleThatJobWaitFollows) {
-    UsbPrinterWithQueue();
+    // The queue is left disabled, so that the jobs stay listed.
+    PlugUsbDevice({});
+    ASSERT_EQ(Cli({"usb", "enable", "lp0", "1-1"}).status, 0);
+    ASSERT_EQ(Cli({"queue", "add", kUsbId}).status, 0);
     const Json first = JsonOf({"print", kUsbId, "/tmp/letter.txt", "--title", "letter"}, 0);
     const Json second = JsonOf({"print", kUsbId, "/tmp/letter.txt", "--title", "letter"}, 0);
     const std::string handle = first["job"];
@@ -102,29 +89,12 @@ TEST_F(CliCups, PrintGivesEachJobAUniqueHandleThatJobWaitFollows) {
     EXPECT_EQ(first["title"], handle + " letter");
     ASSERT_TRUE(first["cups_job"].is_number()) << first;
     EXPECT_NE(first["cups_job"], second["cups_job"]);
-    EXPECT_THAT(Tool({"/usr/bin/lpq", "-P", "usbprinter1"}), HasSubstr(handle));
 
     const Json held = JsonOf({"job", "wait", kUsbId, handle, "--timeout", "1"}, 1);
     EXPECT_EQ(held["complete"], false);
+    // The number given is the job's own: cancelling it ends the wait.
     Tool({"/usr/bin/lprm", "-P", "usbprinter1", std::to_string(first["cups_job"].get<int>())});
     EXPECT_EQ(JsonOf({"job", "wait", kUsbId, handle, "--timeout", "5"}, 0)["complete"], true);
-    // The other job, same title text, is still there.
-    EXPECT_EQ(JsonOf({"job", "wait", kUsbId, second["job"], "--timeout", "1"}, 1)["complete"], false);
-
-    const Json test = JsonOf({"print", "test-page", kUsbId}, 0);
-    EXPECT_EQ(test["job"], "testprint");
-    EXPECT_TRUE(test["cups_job"].is_number()) << test;
-}
-
-TEST_F(CliCups, SpoolCleanFailsWhileCupsStillListsJobs) {
-    UsbPrinterWithQueue();
-    ASSERT_EQ(Cli({"print", kUsbId, "/tmp/letter.txt"}).status, 0);
-    const Json left = JsonOf({"spool", "clean"}, 1);
-    EXPECT_EQ(left["cleaned"], false);
-    EXPECT_EQ(left["jobs_left"], 1);
-    EXPECT_THAT(left["error"]["message"].get<std::string>(), HasSubstr("still lists 1 job"));
-    Tool({"/usr/bin/cancel", "-a"});
-    EXPECT_EQ(JsonOf({"spool", "clean"}, 0)["cleaned"], true);
 }
 
 TEST_F(CliCups, NetAddUndoesItsStepsWhenTheQueueCannotBeMade) {
@@ -135,17 +105,14 @@ TEST_F(CliCups, NetAddUndoesItsStepsWhenTheQueueCannotBeMade) {
     EXPECT_EQ(add["undone"], Json::array({"network printer table line 127.0.0.7"}));
     ASSERT_EQ(add["remains"].size(), 1u);
     EXPECT_THAT(add["remains"][0].get<std::string>(), HasSubstr("section [127.0.0.7-office]"));
-    EXPECT_EQ(JsonOf({"list"}, 0)["count"], 0);
 }
 
-TEST_F(CliCups, NetAddRefusesAnAddressOrNameInUseUnlessReplacing) {
+// An address in use is refused among the rows of the JSON table below.
+TEST_F(CliCups, NetAddRefusesANameInUseAndReplacesAPrinterOnlyWhenAsked) {
     ASSERT_EQ(Cli({"net", "add", "127.0.0.5", "bigbrand"}).status, 0);
-    for (const auto &[ip, name] : std::vector<std::pair<std::string, std::string>>{{"127.0.0.5", "xb"},
-                                                                                    {"127.0.0.6", "bigbrand"}}) {
-        const CliRun r = Cli({"net", "add", ip, name});
-        EXPECT_EQ(r.status, 1) << ip << " " << name;
-        EXPECT_THAT(r.err, HasSubstr("127.0.0.5-bigbrand"));
-    }
+    const CliRun refused = Cli({"net", "add", "127.0.0.6", "bigbrand"});
+    EXPECT_EQ(refused.status, 1);
+    EXPECT_THAT(refused.err, HasSubstr("127.0.0.5-bigbrand"));
     EXPECT_EQ(ReadFile("/usr/xavo/etc/nptab"), "127.0.0.5=\"bigbrand\"\n");
     EXPECT_TRUE(Queue("bigbrand").exists);
 
@@ -156,19 +123,15 @@ TEST_F(CliCups, NetAddRefusesAnAddressOrNameInUseUnlessReplacing) {
     EXPECT_TRUE(Queue("xb").exists);
 }
 
-// Removals that match nothing fail among them, with what was missing.
+// Among the failures: removals that match nothing, and a spool clean
+// after which CUPS still lists jobs, each saying what is left.
 TEST_F(CliCups, EverySubcommandPrintsOneJsonShapeOnSuccessAndFailure) {
-    const std::set<std::string> kCommandWords = {
-        "list", "show", "usb", "enable", "disable", "devid", "reset", "queue", "add", "check", "ppd", "remove",
-        "purge-usb", "print", "test-page", "job", "wait", "spool", "clean", "net", "ping", "probe", "share",
-        "status", "cloud", "get", "set", "usbip", "lock-status", "eject", "release"};
     PlugUsbDevice({});
-    PlaceFile("/tmp/pw", "secret-1\n");
     const struct {
         std::vector<std::string> args;
         int status;
         std::string input = "";
-        std::string says = "";  // in the error message
+        ::testing::Matcher<std::string> out = ::testing::_;
     } runs[] = {
         {{"list"}, 0},
         {{"show", kUsbId}, 1},
@@ -177,7 +140,7 @@ TEST_F(CliCups, EverySubcommandPrintsOneJsonShapeOnSuccessAndFailure) {
         {{"usb", "devid", "lp1"}, 1},
         {{"usb", "reset", "lp1"}, 1},
         {{"show", kUsbId}, 0},
-        {{"queue", "remove", kUsbId}, 1, "", "has no CUPS queue name"},
+        {{"queue", "remove", kUsbId}, 1, "", HasSubstr("has no CUPS queue name")},
         {{"queue", "add", "no-such-printer"}, 1},
         {{"queue", "add", kUsbId}, 0},
         {{"queue", "enable", "usbprinter1"}, 0},
@@ -185,28 +148,28 @@ TEST_F(CliCups, EverySubcommandPrintsOneJsonShapeOnSuccessAndFailure) {
         {{"queue", "disable", "nosuch"}, 1},
         {{"queue", "check", kUsbId, "usbprinter1"}, 0},
         {{"queue", "ppd", kUsbId}, 1},
-        {{"list"}, 0},
         {{"print", kUsbId, "/tmp/letter.txt"}, 0},
         {{"print", "no-such-printer", "/tmp/letter.txt"}, 1},
-        {{"print", "test-page", kUsbId}, 0},
+        // The test page's handle is the file's name: the library gives it no title.
+        {{"print", "test-page", kUsbId}, 0, "", ContainsRegex(R"("job":"testprint","cups_job":[0-9]+,)")},
         {{"print", "test-page", "no-such-printer"}, 1},
         {{"job", "wait", kUsbId, "testprint", "--timeout", "1"}, 1},
-        {{"spool", "clean"}, 1},
+        // The queue is disabled: the letter and the test page stay listed.
+        {{"spool", "clean"}, 1, "",
+         AllOf(HasSubstr(R"("cleaned":false,"jobs_left":2,)"), HasSubstr("still lists 2 job"))},
         {{"net", "ping", "127.0.0.1"}, 0},
         {{"net", "add", "127.0.0.5", "bigbrand"}, 0},
-        {{"net", "add", "127.0.0.5", "xb"}, 1},
+        {{"net", "add", "127.0.0.5", "xb"}, 1, "", HasSubstr("already in use (127.0.0.5-bigbrand")},
         {{"net", "check", "127.0.0.5", "bigbrand"}, 0},
         {{"net", "check", "127.0.0.5"}, 0},
         {{"net", "remove", "127.0.0.5", "bigbrand"}, 0},
-        {{"net", "remove", "127.0.0.5", "bigbrand"}, 1, "", "no network printer 127.0.0.5-bigbrand"},
-        {{"net", "remove", "127.0.0.9", "none"}, 1, "", "no network printer 127.0.0.9-none"},
+        {{"net", "remove", "127.0.0.5", "bigbrand"}, 1, "", HasSubstr("no network printer 127.0.0.5-bigbrand")},
         {{"net", "probe", "127.0.0.9"}, 1},
         {{"queue", "remove", kUsbId}, 0},
-        {{"queue", "remove", kUsbId}, 1, "", "nothing to remove: CUPS has no queue usbprinter"},
+        {{"queue", "remove", kUsbId}, 1, "", HasSubstr("nothing to remove: CUPS has no queue usbprinter")},
         {{"queue", "purge-usb"}, 1},
-        {{"usb", "disable", "--bus", "9-9"}, 1, "", "nothing to forget: no line for bus 9-9"},
+        {{"usb", "disable", "--bus", "9-9"}, 1, "", HasSubstr("nothing to forget: no line for bus 9-9")},
         {{"usb", "disable", "lp0"}, 0},
-        {{"usb", "disable", "lp0"}, 1, "", "nothing to forget"},
         {{"share", "status"}, 0},
         {{"cloud", "get"}, 1},
         {{"cloud", "set", "u@example.com"}, 1, ""},
@@ -217,25 +180,21 @@ TEST_F(CliCups, EverySubcommandPrintsOneJsonShapeOnSuccessAndFailure) {
         {{"usbip", "release", kUsbId}, 1},
     };
     std::map<std::string, std::vector<std::string>> shapes;
-    std::string outputs;
     for (const auto &run : runs) {
         const CliRun r = JsonRun(run.args, run.status, run.input);
         const std::string what = ::testing::PrintToString(run.args);
-        ASSERT_EQ(JsonShapeProblem(r.out), "") << what;
-        EXPECT_THAT(Json::parse(r.out)["error"].dump(), HasSubstr(run.says)) << what;
-        outputs += r.out;
+        EXPECT_THAT(r.out, run.out) << what;
         EXPECT_EQ(r.out.find("\"-\""), std::string::npos) << what;
-        std::string path;
-        for (size_t i = 0; i < run.args.size() && kCommandWords.count(run.args[i]) != 0; ++i) {
-            path += (i ? " " : "") + run.args[i];
-        }
+        // "print ID FILE", "list" and "show" are subcommands of one word.
+        const bool bOneWord = run.args[0] == "list" || run.args[0] == "show" ||
+                              (run.args[0] == "print" && run.args[1] != "test-page");
+        const std::string path = bOneWord ? run.args[0] : run.args[0] + " " + run.args[1];
         const auto [at, bNew] = shapes.emplace(path, JsonKeys(r.out));
         if (!bNew) {
             EXPECT_EQ(at->second, JsonKeys(r.out)) << what;
         }
     }
     EXPECT_EQ(shapes.size(), 28u);
-    EXPECT_TRUE(PythonAcceptsJsonLines(outputs));
 }
 
 }  // namespace
