@@ -44,14 +44,6 @@ inline CliRun Cli(const std::vector<std::string> &args, const std::string &input
     return run;
 }
 
-// Whether Python's own JSON reader takes every line of the text as one
-// JSON value (strict UTF-8 included).  One run for many outputs: the
-// interpreter's start costs more than the check.
-inline bool PythonAcceptsJsonLines(const std::string &lines) {
-    PlaceFile("/tmp/cli.json", lines);
-    return std::system("python3 -m json.tool --json-lines /tmp/cli.json >/dev/null 2>&1") == 0;
-}
-
 // What is wrong with the shape every --json run must have ("" when
 // nothing): one line of strict JSON, one object, "ok" a boolean, "notes" an array, "error" null on
 // success and {code, name, message} on failure.
