@@ -17,7 +17,7 @@
 #include "xavoprinter.h"
 
 namespace {
-constexpr char kUnit[] = "printer_enable_ext";
+constexpr const char *kUnit = xavo::kEnableExtUnit;
 
 constexpr char kLogLockFailed[] = "%s:%d ORLICFileLock() failed.";
 constexpr char kLogUnlockFailed[] = "%s:%d unlock LOCK_USBIDMAP failed";

@@ -19,7 +19,7 @@
 
 namespace {
 // Logged as the operation's own steps.
-constexpr char kUnit[] = "printer_enable_ext";
+constexpr const char *kUnit = xavo::kEnableExtUnit;
 
 constexpr char kLogDevInfoFailed[] = "%s:%d XAVOUSBDevGetInfo failed. (0x%04X)";
 constexpr char kLogWrongPrinterId[] = "%s:%d wrong printer id format! errno=0x[%X]";

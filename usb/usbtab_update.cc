@@ -14,7 +14,7 @@
 
 namespace {
 // Logged as the operation's own steps.
-constexpr char kUnit[] = "printer_enable_ext";
+constexpr const char *kUnit = xavo::kEnableExtUnit;
 
 constexpr char kLogSetUsbtabFailed[] = "%s:%d Set usbtab failed, devname=%s, device=%s";
 constexpr char kLogRmUsbtabFailed[] = "%s:%d rm usbtab failed, key=%s";
