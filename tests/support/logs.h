@@ -27,15 +27,18 @@ inline bool IsLibraryLine(const LogLine &line) {
     return std::regex_search(line.message, kUnitLine);
 }
 
-// The library's lines logged since the last call, normalised; the others
+// The lines logged since the last call, normalised: the library's own
+// (bLibrary) or the others ("7 lpstat: No destinations added."); the rest
 // are dropped.
-inline std::vector<std::string> Logs() {
+inline std::vector<std::string> TakeLines(bool bLibrary) {
     std::vector<std::string> out;
     for (const LogLine &line : TakeLogs()) {
-        if (IsLibraryLine(line)) out.push_back(NormaliseLogLine(line));
+        if (IsLibraryLine(line) == bLibrary) out.push_back(NormaliseLogLine(line));
     }
     return out;
 }
+inline std::vector<std::string> Logs() { return TakeLines(true); }
+inline std::vector<std::string> ProgramLogs() { return TakeLines(false); }
 
 // The library's lines of the units whose names begin with unit
 // ("printer_net_"), for suites where other units log as well.
@@ -43,16 +46,6 @@ inline std::vector<std::string> UnitLogs(const std::string &unit) {
     std::vector<std::string> out;
     for (const std::string &line : Logs()) {
         if (line.find(" " + unit) != std::string::npos) out.push_back(line);
-    }
-    return out;
-}
-
-// The other lines logged since the last call ("7 lpstat: No destinations
-// added."); the library's are dropped.
-inline std::vector<std::string> ProgramLogs() {
-    std::vector<std::string> out;
-    for (const LogLine &line : TakeLogs()) {
-        if (!IsLibraryLine(line)) out.push_back(NormaliseLogLine(line));
     }
     return out;
 }
