@@ -160,7 +160,14 @@ public:
     SigchldScope(const SigchldScope &) = delete;
     SigchldScope &operator=(const SigchldScope &) = delete;
     ~SigchldScope() {
-        if (setting_.handler == SIG_DFL) waitpid(own_, nullptr, 0);
+        // The caller's child may outlive a quick mix on a loaded machine:
+        // it must have ended, and its SIGCHLD reached the handler, before
+        // the setting goes.  (With SIGCHLD ignored, waitpid returns once
+        // the child has ended and the kernel has reaped it.)
+        if (setting_.handler == SIG_DFL || setting_.handler == SIG_IGN) waitpid(own_, nullptr, 0);
+        for (int i = 0; i < 1000 && setting_.handler == ReapEveryChild && gReapingHandlerCalls == 0; ++i) {
+            std::this_thread::sleep_for(std::chrono::milliseconds(10));
+        }
         if (setting_.bBlocked) sigprocmask(SIG_SETMASK, &oldMask_, nullptr);
         sigaction(SIGCHLD, &old_, nullptr);
     }
