@@ -5,15 +5,14 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <signal.h>
-#include <spawn.h>
 #include <sys/stat.h>
-#include <sys/wait.h>
 
 #include <functional>
 #include <string>
 #include <vector>
 
 #include "appliance/standin_control.h"
+#include "sandbox/cupsd.h"
 #include "support/cases.h"
 #include "support/fault_sweep.h"
 #include "support/logs.h"
@@ -96,28 +95,16 @@ void PlaceLpq(const std::string &listing) {
     PlaceRecorder("/usr/bin/lpq", "lpq");
 }
 
-// A process the appliance takes for a running scheduler ("cupsd" is its
-// command name), for the tests whose lpq is a fake.
-class SchedulerStandIn {
-public:
-    SchedulerStandIn() {
-        PlaceFile("/tmp/cupsd", ReadFile("/bin/sleep"), 0755);
-        char *args[] = {const_cast<char *>("/tmp/cupsd"), const_cast<char *>("120"), nullptr};
-        if (posix_spawn(&pid_, args[0], nullptr, nullptr, args, environ) != 0) pid_ = -1;
-        AwaitCommandName(pid_, "cupsd");
-    }
-    SchedulerStandIn(const SchedulerStandIn &) = delete;
-    SchedulerStandIn &operator=(const SchedulerStandIn &) = delete;
-    ~SchedulerStandIn() { if (pid_ > 0) { kill(pid_, SIGKILL); waitpid(pid_, nullptr, 0); } }
-
-private:
-    pid_t pid_ = -1;
-};
-
+// A real scheduler running, for the tests whose lpq is a fake: the job
+// questions are only asked of a running one.
 class JobWaitListing : public ::testing::Test {
 protected:
-    void SetUp() override { SetCupsName(kPrinter, kQueue); }
-    SchedulerStandIn scheduler_;
+    void SetUp() override {
+        Cupsd::Start();
+        ASSERT_GT(Cupsd::Pid(), 0);
+        SetCupsName(kPrinter, kQueue);
+    }
+    void TearDown() override { Cupsd::Stop(); }
 };
 
 // The job ID is looked for as raw text in the listing's lines.
