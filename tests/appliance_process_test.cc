@@ -4,10 +4,13 @@
 // only the appliance's own file name pattern is expanded, arguments reach
 // the program as given, and the child gets /dev/null for input and the C
 // locale.  What a caller's SIGCHLD handling may not change is proven
-// through every entry point by the child-hygiene proof.
+// through every entry point by the child-hygiene proof.  And the lookup of
+// a running daemon: the one found last time is looked at first but never
+// taken on trust (the same lookup answers ORLICIsProcAlive).
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <signal.h>
+#include <spawn.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -94,6 +97,24 @@ const EntryPoint kEntryPoints[] = {
 // and never ends either.
 constexpr char kNeverEnding[] =
     "#!/bin/sh\necho started\nsleep 1000 &\necho $! > /tmp/helper.pid\nwhile :; do sleep 1; done\n";
+
+// A stand-in cupsd: sleep under the daemon's name, so that the kernel
+// gives the process that command name.
+pid_t StartFakeCupsd() {
+    PlaceFile("/tmp/fake/cupsd", ReadFile("/bin/sleep"), 0755);
+    const char *argv[] = {"cupsd", "30", nullptr};
+    pid_t pid = -1;
+    EXPECT_EQ(posix_spawn(&pid, "/tmp/fake/cupsd", nullptr, nullptr, const_cast<char **>(argv), environ), 0);
+    AwaitCommandName(pid, "cupsd");
+    return pid;
+}
+
+bool IsZombie(pid_t pid) {
+    for (const SandboxProcess &p : Descendants()) {
+        if (p.pid == pid) return p.state == 'Z';
+    }
+    return false;
+}
 
 }  // namespace
 
@@ -214,3 +235,23 @@ TEST(PlatformProcess, ChildGetsNullInputAndTheCLocale) {
     EXPECT_THAT(text, ::testing::AllOf(StartsWith("/dev/null\n"), HasSubstr("LC_ALL=C\n"), HasSubstr("PATH="),
                                        Not(HasSubstr("LANG=")), Not(HasSubstr("XAVO_CALLERS_SECRET"))));
 }
+
+TEST(PlatformServices, DaemonFoundLastIsCheckedAgainEveryTime) {
+    ASSERT_EQ(ORLIServiceIsRunning("cupsd"), 0);
+    const pid_t first = StartFakeCupsd();
+    EXPECT_EQ(ORLIServiceIsRunning("cupsd"), 1);
+    EXPECT_EQ(ORLICIsProcAlive("cupsd"), 1) << "the same lookup, nothing remembered";
+    ASSERT_EQ(kill(first, SIGKILL), 0);
+    // A zombie is no running daemon, nor a reaped one.
+    for (int i = 0; i < 400 && !IsZombie(first); ++i) std::this_thread::sleep_for(std::chrono::milliseconds(5));
+    ASSERT_TRUE(IsZombie(first));
+    EXPECT_EQ(ORLIServiceIsRunning("cupsd"), 0) << "zombie";
+    EXPECT_EQ(ORLICIsProcAlive("cupsd"), 0) << "zombie";
+    ASSERT_EQ(waitpid(first, nullptr, 0), first);
+    EXPECT_EQ(ORLIServiceIsRunning("cupsd"), 0) << "reaped";
+    const pid_t second = StartFakeCupsd();
+    EXPECT_EQ(ORLIServiceIsRunning("cupsd"), 1);
+    kill(second, SIGKILL);
+    waitpid(second, nullptr, 0);
+}
+
