@@ -39,10 +39,6 @@ namespace {
 constexpr char kTool[] = "/usr/bin/xavo-tool";
 constexpr double kSlack = 1.5;  // a loaded machine's delay on top
 
-double Since(std::chrono::steady_clock::time_point start) {
-    return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
-}
-
 // All of a stream; a read that a signal interrupted is taken again.
 std::string ReadAll(FILE *stream) {
     std::string text;
@@ -119,7 +115,7 @@ TEST(RunnerTimeLimit, EveryEntryPointStopsTheToolAndWhatItStartedAtTheLimit) {
         std::string out;
         const auto start = std::chrono::steady_clock::now();
         EXPECT_EQ(e.run(&out), -1) << e.szName;
-        const double seconds = Since(start);
+        const double seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
         EXPECT_GE(seconds, 0.9) << e.szName;
         EXPECT_LT(seconds, 1 + kSlack) << e.szName << ": the tool ends at SIGTERM";
         EXPECT_EQ(ORLICErrGet(), 0x2A00u) << e.szName;
