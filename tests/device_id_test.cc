@@ -14,8 +14,7 @@
 #include "xavoprinter.h"
 
 using ::testing::IsEmpty;
-using xavo::test::kConf;
-using xavo::test::Logs;
+using namespace xavo::test;
 
 namespace {
 
@@ -84,15 +83,11 @@ TEST(DeviceIdGetters, TakeTheFirstOfTheirKeysFound) {
     }
 }
 
-void StoreStringId(const char *szPrinterId, const char *szStringId) {
-    xavo::test::WriteSection(kConf, szPrinterId, {{"usblp string id", szStringId}});
-}
-
 // Brand and model that the pair walk finds in a stored device ID string,
 // starting from "keep" in both; no other field of the record is written.
 std::pair<std::string, std::string> Detect(const std::string &id) {
-    xavo::test::ResetSandbox();
-    StoreStringId("printer", id.c_str());
+    ResetSandbox();
+    WriteSection(kConf, "printer", {{"usblp string id", id}});
     UsbPrinterConf conf;
     std::memset(&conf, 'z', sizeof conf);
     std::strcpy(conf.szPrinterId, "printer");
@@ -135,7 +130,7 @@ TEST(ModelDetect, TakesTheFirstPairOfEachItemWithKeysRunningToTheNextColon) {
 }
 
 TEST(ModelDetect, MissingOrEmptyStringIdFailsWithErrExec) {
-    StoreStringId("empty", "");
+    WriteSection(kConf, "empty", {{"usblp string id", ""}});
     for (const char *id : {"empty", "unknown"}) {
         UsbPrinterConf conf{};
         std::strcpy(conf.szPrinterId, id);
