@@ -4,17 +4,19 @@
 // only the appliance's own file name pattern is expanded, arguments reach
 // the program as given, and the child gets /dev/null for input and the C
 // locale.  What a caller's SIGCHLD handling may not change is proven
-// through every entry point by the child-hygiene proof.
+// through every entry point by the child-hygiene proof.  And the lookup of
+// a running daemon: the one found last time is looked at first but never
+// taken on trust (the same lookup answers ORLICIsProcAlive).
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <signal.h>
+#include <spawn.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <cerrno>
 #include <chrono>
 #include <cstdio>
-#include <functional>
 #include <string>
 #include <thread>
 #include <vector>
@@ -37,10 +39,6 @@ namespace {
 constexpr char kTool[] = "/usr/bin/xavo-tool";
 constexpr double kSlack = 1.5;  // a loaded machine's delay on top
 
-double Since(std::chrono::steady_clock::time_point start) {
-    return std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
-}
-
 // All of a stream; a read that a signal interrupted is taken again.
 std::string ReadAll(FILE *stream) {
     std::string text;
@@ -57,29 +55,55 @@ std::string ReadAll(FILE *stream) {
     }
 }
 
+int32_t PopenAndRead(std::string *pOut) {
+    FILE *stream = ORLICPopen(kTool, "r", "a", nullptr);
+    if (stream == nullptr) return -100;
+    *pOut = ReadAll(stream);
+    return ORLICPclose(stream);
+}
+
 // The two ways a run is waited for, reduced to "result, output read":
 // ORLICExecl and ORLICExecv wait as ORLICExec does (one runner under the
 // three), and every entry point is run through the library by the
-// child-hygiene proof.
+// child-hygiene proof.  The last row is a caller that blocks every signal
+// and ignores SIGCHLD, so that neither a signal nor its child's exit can
+// wake the wait.
 struct EntryPoint {
     const char *szName;
-    std::function<int32_t(std::string *)> run;
+    int32_t (*run)(std::string *pOut);
+    bool bReads;
 };
 const EntryPoint kEntryPoints[] = {
-    {"ORLICExec", [](std::string *) { return ORLICExec(kTool, "a", nullptr, nullptr, nullptr); }},
-    {"ORLICPopen",
+    {"ORLICExec", [](std::string *) { return ORLICExec(kTool, "a", nullptr, nullptr, nullptr); }, false},
+    {"ORLICPopen", PopenAndRead, true},
+    {"ORLICPopen, every signal blocked, SIGCHLD ignored",
      [](std::string *pOut) {
-         FILE *stream = ORLICPopen(kTool, "r", "a", nullptr);
-         if (stream == nullptr) return int32_t{-100};
-         *pOut = ReadAll(stream);
-         return ORLICPclose(stream);
-     }},
+         SigchldScope ignored(kSigchldSettings[1]);
+         sigset_t all, old;
+         sigfillset(&all);
+         pthread_sigmask(SIG_SETMASK, &all, &old);
+         const int32_t result = PopenAndRead(pOut);
+         pthread_sigmask(SIG_SETMASK, &old, nullptr);
+         return result;
+     },
+     true},
 };
 
 // A tool that prints a line, starts a helper of its own that never ends,
 // and never ends either.
 constexpr char kNeverEnding[] =
     "#!/bin/sh\necho started\nsleep 1000 &\necho $! > /tmp/helper.pid\nwhile :; do sleep 1; done\n";
+
+// A stand-in cupsd: sleep under the daemon's name, so that the kernel
+// gives the process that command name.
+pid_t StartFakeCupsd() {
+    PlaceFile("/tmp/fake/cupsd", ReadFile("/bin/sleep"), 0755);
+    const char *argv[] = {"cupsd", "30", nullptr};
+    pid_t pid = -1;
+    EXPECT_EQ(posix_spawn(&pid, "/tmp/fake/cupsd", nullptr, nullptr, const_cast<char **>(argv), environ), 0);
+    AwaitCommandName(pid, "cupsd");
+    return pid;
+}
 
 }  // namespace
 
@@ -91,33 +115,17 @@ TEST(RunnerTimeLimit, EveryEntryPointStopsTheToolAndWhatItStartedAtTheLimit) {
         std::string out;
         const auto start = std::chrono::steady_clock::now();
         EXPECT_EQ(e.run(&out), -1) << e.szName;
-        const double seconds = Since(start);
+        const double seconds = std::chrono::duration<double>(std::chrono::steady_clock::now() - start).count();
         EXPECT_GE(seconds, 0.9) << e.szName;
         EXPECT_LT(seconds, 1 + kSlack) << e.szName << ": the tool ends at SIGTERM";
         EXPECT_EQ(ORLICErrGet(), 0x2A00u) << e.szName;
-        if (std::string(e.szName) == "ORLICPopen") {
-            EXPECT_EQ(out, "started\n");
+        if (e.bReads) {
+            EXPECT_EQ(out, "started\n") << e.szName;
         }
         EXPECT_TRUE(EndsSoon(std::stoi(ReadFile("/tmp/helper.pid")))) << e.szName << ": its group is stopped";
         EXPECT_THAT(ProgramLogs(), ElementsAre("7 xavo-tool: no exit within its time limit, stopped")) << e.szName;
         EXPECT_TRUE(NothingLeft()) << e.szName;
     }
-    // The same for a caller that blocks every signal and ignores SIGCHLD.
-    {
-        SigchldScope ignored(kSigchldSettings[1]);
-        sigset_t all, old;
-        sigfillset(&all);
-        pthread_sigmask(SIG_SETMASK, &all, &old);
-        const auto start = std::chrono::steady_clock::now();
-        std::string out;
-        const int32_t result = kEntryPoints[1].run(&out);
-        const double seconds = Since(start);
-        pthread_sigmask(SIG_SETMASK, &old, nullptr);
-        EXPECT_EQ(result, -1);
-        EXPECT_LT(seconds, 1 + kSlack);
-        EXPECT_TRUE(EndsSoon(std::stoi(ReadFile("/tmp/helper.pid"))));
-    }
-    EXPECT_TRUE(NothingLeft());
     // 0 gives every tool its own limit again (more than 1.2 s).  The
     // SIGKILL after the grace, for a tool that ignores SIGTERM, is proven by
     // the proof suite of child hygiene.
@@ -216,3 +224,24 @@ TEST(PlatformProcess, ChildGetsNullInputAndTheCLocale) {
     EXPECT_THAT(text, ::testing::AllOf(StartsWith("/dev/null\n"), HasSubstr("LC_ALL=C\n"), HasSubstr("PATH="),
                                        Not(HasSubstr("LANG=")), Not(HasSubstr("XAVO_CALLERS_SECRET"))));
 }
+
+TEST(PlatformServices, DaemonFoundLastIsCheckedAgainEveryTime) {
+    ASSERT_EQ(ORLIServiceIsRunning("cupsd"), 0);
+    const pid_t first = StartFakeCupsd();
+    EXPECT_EQ(ORLIServiceIsRunning("cupsd"), 1);
+    EXPECT_EQ(ORLICIsProcAlive("cupsd"), 1) << "the same lookup, nothing remembered";
+    ASSERT_EQ(kill(first, SIGKILL), 0);
+    // A zombie is no running daemon, nor a reaped one.  Only this process
+    // reaps its child: until the waitpid below, an ended one is a zombie.
+    for (int i = 0; i < 400 && Running(first); ++i) std::this_thread::sleep_for(std::chrono::milliseconds(5));
+    ASSERT_FALSE(Running(first));
+    EXPECT_EQ(ORLIServiceIsRunning("cupsd"), 0) << "zombie";
+    EXPECT_EQ(ORLICIsProcAlive("cupsd"), 0) << "zombie";
+    ASSERT_EQ(waitpid(first, nullptr, 0), first);
+    EXPECT_EQ(ORLIServiceIsRunning("cupsd"), 0) << "reaped";
+    const pid_t second = StartFakeCupsd();
+    EXPECT_EQ(ORLIServiceIsRunning("cupsd"), 1);
+    kill(second, SIGKILL);
+    waitpid(second, nullptr, 0);
+}
+

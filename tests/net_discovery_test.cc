@@ -101,31 +101,24 @@ constexpr char kBjnpLine[] =
     "network bjnp://10.0.0.1:8611 \"Canon MX920 series\" \"Canon MX920 series 10.0.0.1\" "
     "\"MFG:Canon;CMD:BJL,BJRaster3;MDL:MX920 series;CLS:PRINTER;\"\n";
 
-TEST(BjnpDiscovery, FillsTheRecordFromTheAddressLine) {
-    PlaceProgram(kBjnp, Listing(kBjnpLine));
-    NetPrinterInfo info{};
-    std::strcpy(info.szQName, "kept");
-    errno = EAGAIN;
-    EXPECT_EQ(XAVOPrinterNetBjnpInfoGet("10.0.0.1", &info), 0);
-    EXPECT_EQ(errno, EAGAIN);
-    EXPECT_STREQ(info.szBackend, "bjnp");
-    EXPECT_STREQ(info.szBrand, "Canon");
-    EXPECT_STREQ(info.szModel, "MX920 series");
-    EXPECT_STREQ(info.szStringId, "MFG:Canon;CMD:BJL,BJRaster3;MDL:MX920 series;CLS:PRINTER");
-    EXPECT_STREQ(info.szQName, "kept");
-}
-
 // Each kind of listing line through the operation (format of the CUPS bjnp
-// backend 2.0.3); an empty listing means no backend at all.
-TEST(BjnpDiscovery, ListingLinesDecideTheAnswerAndTheRetries) {
+// backend 2.0.3); an empty listing means no backend at all.  The caller's
+// queue name and errno stay whatever the answer.
+TEST(BjnpDiscovery, ListingLinesDecideTheRecordTheAnswerAndTheRetries) {
     const std::vector<std::uint64_t> kNone, kThreeSeconds(3, 1000000u);
+    struct Record {
+        const char *szBackend = "", *szBrand = "", *szModel = "", *szStringId = "";
+    };
     struct {
         const char *szName;
         std::string listing;
         int32_t result;
         const std::vector<std::uint64_t> &sleeps;
         size_t logs;  // a line per attempt that found the printer without a manufacturer
+        Record record = {};
     } const cases[] = {
+        {"the address line", kBjnpLine, 0, kNone, 0,
+         {"bjnp", "Canon", "MX920 series", "MFG:Canon;CMD:BJL,BJRaster3;MDL:MX920 series;CLS:PRINTER"}},
         {"unknown first", std::string("network bjnp \"Unknown\" \"Canon network printer\"\n") + kBjnpLine, 1, kNone, 0},
         {"addresses that only begin or end alike",
          "network bjnp://10.0.0.11:8611 \"x\" \"x\" \"MFG:C;MDL:D;\"\n"
@@ -141,9 +134,16 @@ TEST(BjnpDiscovery, ListingLinesDecideTheAnswerAndTheRetries) {
             PlaceProgram(kBjnp, Listing(c.listing));
         }
         NetPrinterInfo info{};
+        std::strcpy(info.szQName, "kept");
+        errno = EAGAIN;
         EXPECT_EQ(XAVOPrinterNetBjnpInfoGet("10.0.0.1", &info), c.result) << c.szName;
+        EXPECT_EQ(errno, EAGAIN) << c.szName;
         if (c.result == -1) { EXPECT_EQ(ORLICErrGet(), ERR_EXEC) << c.szName; }
-        EXPECT_STREQ(info.szBackend, "") << c.szName;
+        EXPECT_STREQ(info.szBackend, c.record.szBackend) << c.szName;
+        EXPECT_STREQ(info.szBrand, c.record.szBrand) << c.szName;
+        EXPECT_STREQ(info.szModel, c.record.szModel) << c.szName;
+        EXPECT_STREQ(info.szStringId, c.record.szStringId) << c.szName;
+        EXPECT_STREQ(info.szQName, "kept") << c.szName;
         EXPECT_EQ(TakeSleeps(), c.sleeps) << c.szName;
         EXPECT_EQ(UnitLogs("printer_net_").size(), c.logs) << c.szName;
     }

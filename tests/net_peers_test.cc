@@ -42,7 +42,7 @@ TEST(PingStatus, RealPingOnLoopbackAndWithoutRoute) {
 class AvahiDiscovery : public ::testing::Test {
 protected:
     static void SetUpTestSuite() {
-        avahi_ = new AvahiResponder({
+        avahi_ = std::make_unique<AvahiResponder>(std::vector<MdnsPrinter>{
             {"laser", "127.0.0.1", "Office Laser",
              {{"_ipp._tcp", 631, {"usb_MDL=Laser 100"}},
               {"_pdl-datastream._tcp", 9100, {"usb_CMD=PCL,PJL", "usb_MDL=Laser 100", "usb_MFG=ACME"}}}},
@@ -53,13 +53,9 @@ protected:
              {{"_http._tcp", 80, {"usb_MFG=Other", "usb_MDL=Web"}}, {"_printer._tcp", 515, {}}}},
         });
     }
-    static void TearDownTestSuite() {
-        delete avahi_;
-        avahi_ = nullptr;
-    }
-    static AvahiResponder *avahi_;
+    static void TearDownTestSuite() { avahi_.reset(); }
+    static inline std::unique_ptr<AvahiResponder> avahi_;
 };
-AvahiResponder *AvahiDiscovery::avahi_ = nullptr;
 XAVO_SANDBOX_PER_SUITE(AvahiDiscovery);
 
 // The lookups run at the same time, as the appliance's processes may run
@@ -115,31 +111,25 @@ const std::string kDeviceId = "MFG:ACME;CMD:PCL,PJL;MDL:LaserJet 100;CLS:PRINTER
 
 class SnmpProbe : public ::testing::Test {
 protected:
-    void SetUp() override {
-        if (agents_) return;
+    static void SetUpTestSuite() {
         PlaceSnmpClientConfig();
-        agents_ = new std::vector<std::unique_ptr<SnmpAgent>>;
-        agents_->push_back(std::make_unique<SnmpAgent>(
-            "127.0.0.1", std::vector<SnmpValue>{{".1.1.0", "integer", "7"},
-                                                {".1.2.0", "octet_str", kDeviceId},
-                                                {".1.3.0", "octet_str", "LPR://127.0.0.1/lp1"},
-                                                {".1.4.0", "octet_str", "plain text"}}));
         using Values = std::vector<SnmpValue>;
-        agents_->push_back(std::make_unique<SnmpAgent>("127.0.0.2", Values{{".1.2.0", "octet_str", kDeviceId}}));
-        agents_->push_back(
+        agents_.push_back(std::make_unique<SnmpAgent>(
+            "127.0.0.1", Values{{".1.1.0", "integer", "7"},
+                                {".1.2.0", "octet_str", kDeviceId},
+                                {".1.3.0", "octet_str", "LPR://127.0.0.1/lp1"},
+                                {".1.4.0", "octet_str", "plain text"}}));
+        agents_.push_back(std::make_unique<SnmpAgent>("127.0.0.2", Values{{".1.2.0", "octet_str", kDeviceId}}));
+        agents_.push_back(
             std::make_unique<SnmpAgent>("127.0.0.3", Values{{".1.3.0", "octet_str", "socket://127.0.0.3:9100"}}));
     }
-    static void TearDownTestSuite() {
-        delete agents_;
-        agents_ = nullptr;
-    }
-    static std::vector<std::unique_ptr<SnmpAgent>> *agents_;
+    static void TearDownTestSuite() { agents_.clear(); }
+    static inline std::vector<std::unique_ptr<SnmpAgent>> agents_;
 };
-std::vector<std::unique_ptr<SnmpAgent>> *SnmpProbe::agents_ = nullptr;
 XAVO_SANDBOX_PER_SUITE(SnmpProbe);
 
 TEST_F(SnmpProbe, AnswersOfRealAgents) {
-    for (auto &agent : *agents_) ASSERT_TRUE(agent->running());
+    for (auto &agent : agents_) ASSERT_TRUE(agent->running());
     NetPrinterInfo info;
     std::memset(&info, 'x', sizeof info);
     EXPECT_EQ(XAVOPrinterNetInfoGetByIP("127.0.0.1", &info), 0);

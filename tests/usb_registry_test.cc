@@ -182,18 +182,6 @@ TEST(UsbPrinterPlugIn, RefusesBadArgumentsBeforeTheLockAndDevicesBeyondLp1After)
     }
 }
 
-// A section name is only text: a serial number that would make a path or a
-// file name pattern still registers the printer (only its kept PPD copy is
-// refused, by the queue creation).
-TEST(UsbPrinterPlugIn, SerialThatWouldMakeAPathOrPatternStillRegisters) {
-    for (const char *szSerial : {"SN*", "SN?1", "SN[0]1", "../../../tmp/x", "a/b"}) {
-        ResetSandbox();
-        Plug("lp0", "1-1", szSerial);
-        EXPECT_EQ(XAVOPrinterEnableExt(1, "lp0", "1-1"), 0) << szSerial;
-        EXPECT_EQ(ReadSection(kConf, std::string("04b8:0005:") + szSerial).at("mode"), "usbip") << szSerial;
-    }
-}
-
 // Each failing platform call gives -1 and its code, or is survived (an unreadable section is written anew, an
 // unreadable table has nothing to remove, a busy lock is tried again, a failed release is logged and released once
 // more); none leaves a lock held or the device open.
@@ -247,34 +235,40 @@ TEST(UsbPrinterListing, DeviceNamesIdsAndCountsFollowTheTable) {
     EXPECT_EQ(ORLICErrGet(), ERR_BAD_PARAMETERS);
 }
 
-// The USB library keeps serial numbers of up to 127 characters; with vendor
-// and product before it the ID is cut to 127, and a caller that learns the
-// ID from a listing must find the section and get the queue.
-class LongSerialPrinter : public ::testing::Test {
+// A section name is only text: a serial number that would make a path or a
+// file name pattern still registers the printer (only its kept PPD copy is
+// refused, by the queue creation).  The USB library keeps serial numbers of
+// up to 127 characters; with vendor and product before it the ID is cut to
+// 127, and a caller that learns the ID from a listing must find the section
+// and get the queue.
+class UnusualSerial : public ::testing::Test {
 protected:
     void TearDown() override { Cupsd::Stop(); }
 };
 
-TEST_F(LongSerialPrinter, IsListedUnderItsSectionsNameAndGetsItsQueue) {
-    std::string serial;
-    for (int i = 0; serial.size() < 127; ++i) serial += std::to_string(i % 10);
-    const std::string id = ("04b8:0005:" + serial).substr(0, 127);
-    Plug("lp0", "1-1", serial);
-    ASSERT_EQ(XAVOPrinterEnableExt(1, "lp0", "1-1"), 0);
-    EXPECT_EQ(ReadSection(kConf, id).at("mode"), "usbip");
-
-    ORLICSzList *list = nullptr;
-    ASSERT_EQ(XAVOPrinterEnumCount(XAVO_PRINTER_TYPE_USB, &list), 1);
-    const std::vector<std::string> listed = Items(list);
-    ORLICSzListFree(list);
-    ASSERT_THAT(listed, ElementsAre(id));
+TEST_F(UnusualSerial, IsListedUnderItsSectionsNameAndALongOneGetsItsQueue) {
+    std::string longSerial;
+    for (int i = 0; longSerial.size() < 127; ++i) longSerial += std::to_string(i % 10);
+    const std::string longId = ("04b8:0005:" + longSerial).substr(0, 127);
+    const std::vector<std::string> serials = {"SN*", "SN?1", "SN[0]1", "../../../tmp/x", "a/b", longSerial};
+    for (const std::string &serial : serials) {
+        ResetSandbox();
+        const std::string id = ("04b8:0005:" + serial).substr(0, 127);
+        Plug("lp0", "1-1", serial);
+        ASSERT_EQ(XAVOPrinterEnableExt(1, "lp0", "1-1"), 0) << serial;
+        EXPECT_EQ(ReadSection(kConf, id).at("mode"), "usbip") << serial;
+        ORLICSzList *list = nullptr;
+        ASSERT_EQ(XAVOPrinterEnumCount(XAVO_PRINTER_TYPE_USB, &list), 1) << serial;
+        EXPECT_THAT(Items(list), ElementsAre(id));
+        ORLICSzListFree(list);
+    }
 
     Cupsd::Start();
-    ASSERT_EQ(XAVOPrinterCupsAdd(listed[0].c_str(), nullptr), 0);
+    ASSERT_EQ(XAVOPrinterCupsAdd(longId.c_str(), nullptr), 0);
     char szName[64] = {};
-    ASSERT_EQ(XAVOPrinterCupsNameGet(listed[0].c_str(), szName, sizeof szName), 0);
+    ASSERT_EQ(XAVOPrinterCupsNameGet(longId.c_str(), szName, sizeof szName), 0);
     EXPECT_STREQ(szName, "usbprinter1");
-    EXPECT_EQ(Queue("usbprinter1").deviceUri, "usb:/dev/usb/" + id);
+    EXPECT_EQ(Queue("usbprinter1").deviceUri, "usb:/dev/usb/" + longId);
 }
 
 }  // namespace
