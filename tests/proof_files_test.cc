@@ -70,11 +70,11 @@ constexpr int kSetups = 25;
 bool Setups(int p, int i) {
     const std::string v = Value(p, i);
     UsbPrinterConf own = UsbRecord(("usb-own-" + std::to_string(p)).c_str());
-    std::snprintf(own.szDriver, sizeof own.szDriver, "%s", v.c_str());
+    Fill(own.szDriver, v);
     UsbPrinterConf shared = UsbRecord("usb-shared");
     PutField(&shared, kOwnedKeys[p].usbField, v);
     NetPrinterConf netOwn = NetRecord(("10.1.0." + std::to_string(p + 1)).c_str(), "own");
-    std::snprintf(netOwn.szDriver, sizeof netOwn.szDriver, "%s", v.c_str());
+    Fill(netOwn.szDriver, v);
     NetPrinterConf netShared = NetRecord("10.1.1.1", "shared");
     PutField(&netShared, kOwnedKeys[p].netField, v);
     const PrinterGoogleInfo cloud =

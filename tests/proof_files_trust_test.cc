@@ -48,7 +48,7 @@ void PlugPrinter() {
 // The writes of each file, as the appliance's services make them.
 void SetUpUsb() {
     UsbPrinterConf conf = UsbRecord(kPrinter);
-    std::strcpy(conf.szDriver, "drv.ppd");
+    Fill(conf.szDriver, "drv.ppd");
     XAVOPrinterConfSetup(&conf, 0);
 }
 void SetUpNet() {
