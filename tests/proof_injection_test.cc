@@ -15,6 +15,7 @@
 #include <future>
 #include <map>
 #include <set>
+#include <sstream>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -34,11 +35,11 @@ namespace {
 using Keys = std::set<std::string>;
 
 const Keys kUsbSectionKeys = {"producer", "product name", "mode", "autolock timer", "manuallock timer",
-                                     "enable airprint", "enable google cloud print", "driver", "driver brand",
-                                     "usblp string id", "fit to page", "cups printer name"};
+                              "enable airprint", "enable google cloud print", "driver", "driver brand",
+                              "usblp string id", "fit to page", "cups printer name"};
 const Keys kNetSectionKeys = {"IP", "cups printer name", "Backend", "QName", "Brand", "Model",
-                                     "enable airprint", "enable google cloud print", "driver brand", "driver",
-                                     "string id", "fit to page"};
+                              "enable airprint", "enable google cloud print", "driver brand", "driver",
+                              "string id", "fit to page"};
 const Keys kCloudSectionKeys = {"google account", "google pass", "refresh token"};
 const Keys kSmbShareKeys = {"comment", "path", "browseable", "public", "guest ok", "writable", "printable"};
 
@@ -61,17 +62,6 @@ std::string_view TrimBlanks(std::string_view s) {
     return s.substr(first, s.find_last_not_of(" \t") - first + 1);
 }
 
-std::vector<std::string_view> SplitAtNewlines(std::string_view text) {
-    std::vector<std::string_view> lines;
-    for (size_t at = 0; at < text.size();) {
-        size_t end = text.find('\n', at);
-        if (end == std::string_view::npos) end = text.size();
-        lines.push_back(text.substr(at, end - at));
-        at = end + 1;
-    }
-    return lines;
-}
-
 // Every line of a file checked the way its reader reads it: lines before
 // any header hold keys of topKeys (a table is nothing but such lines), and a
 // header opens one of the sections when the file has sections at all.  A
@@ -79,12 +69,12 @@ std::vector<std::string_view> SplitAtNewlines(std::string_view text) {
 // writers never make; nor is a comment or a carriage return (a reader that
 // splits lines there would see a line of its own).
 void CheckFile(const char *szFile, const Keys &topKeys, const std::map<std::string, const Keys *> &sections,
-                      std::vector<std::string> *pFound) {
+               std::vector<std::string> *pFound) {
     std::set<std::string> names, keys;
     const Keys *pKeys = &topKeys;
-    const std::string text = ReadFile(szFile);
     const std::string file = szFile;
-    for (std::string_view raw : SplitAtNewlines(text)) {
+    std::istringstream text(ReadFile(szFile));
+    for (std::string raw; std::getline(text, raw);) {
         const std::string_view line = TrimBlanks(raw);
         if (line.find('\r') != std::string_view::npos) pFound->push_back(file + ": carriage return");
         if (!line.empty() && (line[0] == '#' || line[0] == ';')) pFound->push_back(file + ": comment");
@@ -240,14 +230,13 @@ constexpr size_t kTxtPart = 200;
 // The real peers, each printer's values carrying one payload: an SNMP
 // agent per payload, and one mDNS responder announcing a printer per
 // payload.
-class NetworkPeers {
-public:
+struct NetworkPeers {
     explicit NetworkPeers(const std::vector<Payload> &payloads) {
         PlaceSnmpClientConfig();
         std::vector<MdnsPrinter> printers;
         for (size_t i = 0; i < payloads.size(); ++i) {
             const std::string p = payloads[i].text.substr(0, kSnmpPart);
-            agents_.push_back(std::make_unique<SnmpAgent>(
+            agents.push_back(std::make_unique<SnmpAgent>(
                 SnmpAddress(i),
                 std::vector<SnmpValue>{{".1.2.0", "octet_str", Hex("MFG:ACME" + p + ";MDL:M" + p + ";")},
                                        {".1.3.0", "octet_str", Hex("socket://h/" + p)}}));
@@ -255,17 +244,15 @@ public:
             printers.push_back({"inj" + std::to_string(i), MdnsAddress(i), "Injected " + std::to_string(i),
                                 {{"_pdl-datastream._tcp", 9100, {"usb_MFG=" + t, "usb_MDL=" + t, "usb_CMD=" + t}}}});
         }
-        avahi_ = std::make_unique<AvahiResponder>(printers);
+        avahi = std::make_unique<AvahiResponder>(printers);
     }
     bool ready() const {
-        bool bReady = avahi_->ready();
-        for (const auto &agent : agents_) bReady = bReady && agent->running();
+        bool bReady = avahi->ready();
+        for (const auto &agent : agents) bReady = bReady && agent->running();
         return bReady;
     }
-
-private:
-    std::vector<std::unique_ptr<SnmpAgent>> agents_;
-    std::unique_ptr<AvahiResponder> avahi_;
+    std::vector<std::unique_ptr<SnmpAgent>> agents;
+    std::unique_ptr<AvahiResponder> avahi;
 };
 
 // What the mDNS lookup learned of each payload's printer.  Every browse
@@ -320,8 +307,7 @@ std::vector<Channel> Channels(const std::vector<NetPrinterInfo> &mdnsInfo) {
         {"network record", [](size_t, const std::string &p) { return SetUpNetRecord("10.0.0.9", "10.0.0.9-rec", p); }},
         {"network record address and ID", [](size_t, const std::string &p) { return SetUpNetRecord(p, p, kPlain); }},
         {"cloud print record", [](size_t, const std::string &p) {
-             PrinterGoogleInfo info{};
-             FillAll(p, info.szAccount, info.szPassword, info.szRefreshToken);
+             const PrinterGoogleInfo info = CloudRecord(p.c_str(), p.c_str(), p.c_str());
              XAVOPrinterGoogleInfoSet(&info);
              return Expected{{{"Google Cloud Print", &kCloudSectionKeys}}, {}, {}};
          }, false},
@@ -351,28 +337,26 @@ std::vector<Channel> Channels(const std::vector<NetPrinterInfo> &mdnsInfo) {
     };
 }
 
-// A real scheduler answers the queue list that queue creation reads; lpadmin
-// and cupsdisable only succeed, since only the appliance's files are looked
-// at.  Stopped on every path.
-struct Scheduler {
-    Scheduler() {
+// A real scheduler answers the queue list that queue creation reads;
+// lpadmin, cupsdisable and the USB/IP service's bind_driver only succeed,
+// since only the appliance's files are looked at.  Stopped on every path.
+class ProofInjection : public ::testing::Test {
+protected:
+    void SetUp() override {
         Cupsd::Start();
         PlaceProgram("/usr/bin/lpadmin", "#!/bin/sh\nexit 0\n");
         PlaceProgram("/usr/bin/cupsdisable", "#!/bin/sh\nexit 0\n");
+        PlaceProgram("/usr/bin/bind_driver", "#!/bin/sh\nexit 0\n");
     }
-    Scheduler(const Scheduler &) = delete;
-    Scheduler &operator=(const Scheduler &) = delete;
-    ~Scheduler() { Cupsd::Stop(); }
+    void TearDown() override { Cupsd::Stop(); }
 };
 
 }  // namespace
 
-TEST(ProofInjection, NoSectionKeyOrLineOfOutsideTextInAnyFileTheLibraryWrites) {
+TEST_F(ProofInjection, NoSectionKeyOrLineOfOutsideTextInAnyFileTheLibraryWrites) {
     const std::vector<Payload> payloads = Payloads();
     NetworkPeers peers(payloads);
     ASSERT_TRUE(peers.ready()) << AvahiResponder::DaemonLog();
-    Scheduler scheduler;
-    PlaceProgram("/usr/bin/bind_driver", "#!/bin/sh\nexit 0\n");
     const std::vector<NetPrinterInfo> mdnsInfo = BrowseAll(payloads.size());
 
     Tally tally{"injection"};
