@@ -55,10 +55,11 @@ void SetUpNet() {
     const NetPrinterConf net = NetRecord();
     XAVOPrinterNetConfSetup(&net, 0);
 }
-void AddNet() {
+void UpdateNet(int32_t iAdd) {
     const NetPrinterConf net = NetRecord();
-    XAVOPrinterNetUpdateConf(1, &net);
+    XAVOPrinterNetUpdateConf(iAdd, &net);
 }
+void AddNet() { UpdateNet(1); }
 void SetCloud() {
     const PrinterGoogleInfo cloud = CloudRecord("owner@example.com", "pw", "");
     XAVOPrinterGoogleInfoSet(&cloud);
@@ -80,9 +81,8 @@ struct LinkCase {
 const LinkCase kLinkCases[] = {
     {kConf, [] { SetUpUsb(); SetUpNet(); SetCloud(); }},
     {kNptab, [] {
-         AddNet();
-         const NetPrinterConf net = NetRecord();
-         XAVOPrinterNetUpdateConf(0, &net);
+         UpdateNet(1);
+         UpdateNet(0);
      }},
     {kSmbConf, AddNet},
     {kUsbtab, [] {
