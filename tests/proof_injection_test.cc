@@ -121,9 +121,7 @@ std::vector<std::string> Injections(const Expected &expected) {
 }
 
 void ClearWrittenFiles() {
-    for (const char *szFile : {kConf, kNptab, kUsbtab, kSmbConf}) {
-        std::filesystem::remove(szFile);
-    }
+    for (const char *szFile : {kConf, kNptab, kUsbtab, kSmbConf}) std::filesystem::remove(szFile);
     for (const std::string &path : UsbipFiles()) std::filesystem::remove(path);
 }
 
@@ -183,9 +181,7 @@ Expected PlugAndEnable(const UsbDevice &device, const std::string &deviceId, con
 // What the appliance does with an identified network printer: the record
 // from what identification found, its section and its table line.
 Expected Register(const NetPrinterInfo &info, const char *szIP) {
-    NetPrinterConf conf = NetRecord(szIP, "office", "");
-    Fill(conf.szBackend, info.szBackend);
-    Fill(conf.szQName, info.szQName);
+    NetPrinterConf conf = NetRecord(szIP, "office", info.szBackend, info.szQName);
     Fill(conf.szBrand, info.szBrand);
     Fill(conf.szModel, info.szModel);
     Fill(conf.szStringId, info.szStringId);
