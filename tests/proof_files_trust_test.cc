@@ -137,8 +137,8 @@ struct PlantCase {
     const char *szName;
     std::function<void()> plant;
 };
-void PlantFile(const char *szPath, uid_t uid, mode_t mode) {
-    PlaceFile(szPath, kVictimText, mode);
+void PlantFile(const char *szPath, uid_t uid, mode_t mode, const char *szText = kVictimText) {
+    PlaceFile(szPath, szText, mode);
     ASSERT_EQ(chown(szPath, uid, uid), 0);
     ASSERT_EQ(chmod(szPath, mode), 0);
 }
@@ -209,8 +209,7 @@ TEST(FileTrustProofs, TablePlantedInTmpIsIgnoredAndReplacedByRootsOwn) {
     }
     // The status file of the USB/IP service is root's as well.
     ResetSandbox();
-    PlaceFile("/tmp/usbip_04b8:0005:SN0001", "LOCK=\"Locked by 10.0.0.66\"\n", 0666);
-    ASSERT_EQ(chown("/tmp/usbip_04b8:0005:SN0001", kNobody, kNobody), 0);
+    PlantFile("/tmp/usbip_04b8:0005:SN0001", kNobody, 0666, "LOCK=\"Locked by 10.0.0.66\"\n");
     char status[64] = {};
     EXPECT_TRUE(tally.Check(XAVOPrinterUsbipGetLockStatus(kPrinter, status, sizeof status) == 0 &&
                             std::string(status) == "Free"));
