@@ -101,9 +101,8 @@ TEST(FileSecretProofs, SecretsNeverShowInClearAndDamagedOnesNeverOpen) {
     Tally tally{"secrets"};
     ASSERT_TRUE(SetCloud("", kCanaryToken));
     ASSERT_TRUE(SetCloud(kCanaryPassword, ""));
-    const Section stored = ReadSection(kConf, kSection);
-    const std::string pass = stored.count("google pass") ? stored.at("google pass") : "";
-    const std::string token = stored.count("refresh token") ? stored.at("refresh token") : "";
+    Section stored = ReadSection(kConf, kSection);
+    const std::string pass = stored["google pass"], token = stored["refresh token"];
     ASSERT_TRUE(Opens(pass) && Opens(token)) << "both secrets stored";
 
     CheckArgumentsWhileInUse(&tally);
