@@ -11,29 +11,18 @@
 
 namespace xavo::test {
 
-inline std::string NormaliseLogLine(const LogLine &line) {
-    static const std::regex kUnitLine("^([a-z_]+):[0-9]+ ");
-    return std::to_string(line.priority) + " " + std::regex_replace(line.message, kUnitLine, "$1:N ",
-                                                                    std::regex_constants::format_first_only);
-}
-
-// The library's own lines: every log format of the library begins with the
-// "unit:line " of the source unit that logs.  The rest of what reaches the
-// sandbox's syslog is other programs' to word: the daemons a test starts,
-// and the tools' standard error, which the platform relays at debug
-// priority as "tool: text" (see ProgramLogs()).
-inline bool IsLibraryLine(const LogLine &line) {
-    static const std::regex kUnitLine("^[a-z_]+:[0-9]+ ");
-    return std::regex_search(line.message, kUnitLine);
-}
-
 // The lines logged since the last call, normalised: the library's own
-// (bLibrary) or the others ("7 lpstat: No destinations added."); the rest
-// are dropped.
+// (bLibrary), each of which begins with the "unit:line " of the source
+// unit that logs, or the others ("7 lpstat: No destinations added."): the
+// daemons a test starts, and the tools' standard error, which the platform
+// relays at debug priority as "tool: text".
 inline std::vector<std::string> TakeLines(bool bLibrary) {
+    static const std::regex kUnitLine("^([a-z_]+):[0-9]+ ");
     std::vector<std::string> out;
     for (const LogLine &line : TakeLogs()) {
-        if (IsLibraryLine(line) == bLibrary) out.push_back(NormaliseLogLine(line));
+        if (std::regex_search(line.message, kUnitLine) != bLibrary) continue;
+        out.push_back(std::to_string(line.priority) + " " +
+                      std::regex_replace(line.message, kUnitLine, "$1:N ", std::regex_constants::format_first_only));
     }
     return out;
 }
