@@ -7,22 +7,18 @@
 #include <gtest/gtest.h>
 #include <signal.h>
 #include <sys/socket.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <chrono>
 #include <cstring>
 #include <functional>
 #include <string>
-#include <thread>
-#include <vector>
 
 #include "appliance/standin_control.h"
 #include "sandbox/sandbox.h"
 #include "support/paths.h"
 #include "support/processes.h"
 #include "support/proof_tally.h"
-#include "xavocore.h"
 #include "xavoprinter.h"
 
 using namespace xavo::test;

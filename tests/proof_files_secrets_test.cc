@@ -2,13 +2,11 @@
 // printer configuration file, the log, a process's arguments or a file
 // others can read, and a stored secret that was changed in any way never
 // opens.
-#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <cstring>
 #include <filesystem>
 #include <string>
 #include <vector>
