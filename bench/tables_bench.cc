@@ -10,8 +10,10 @@
 
 #include <cstdio>
 #include <cstdlib>
+#include <functional>
 #include <memory>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "bench/bench.h"
@@ -49,20 +51,28 @@ void PlainRead(const char *path) {
     close(fd);
 }
 
-// Per-call milliseconds of each candidate at each size.
+// Per-call milliseconds of each candidate at each size.  The sizes take
+// their turns within every round like the candidates do, each sample with
+// its own size's table placed first (untimed): measured one size after the
+// other, a few seconds of a busier machine during the largest size alone
+// bent the growth exponent by a tenth or more from one run to the next.
 using Series = std::vector<std::vector<double>>;  // [size][candidate]
 
 Series Measure(const xavo::bench::Options &o, const std::vector<int> &sizes,
                const std::function<std::vector<Candidate>(int n)> &candidatesAt) {
-    Series series;
+    std::vector<Candidate> all;
+    size_t perSize = 0;
     for (int n : sizes) {
-        std::printf("  %d lines:\n", n);
-        std::vector<double> row;
-        for (const xavo::bench::Stats &s : xavo::bench::Interleaved(o, xavo::bench::Clock::kThreadCpu, candidatesAt(n))) {
-            row.push_back(s.median);
+        std::vector<Candidate> at = candidatesAt(n);
+        perSize = at.size();
+        for (Candidate &c : at) {
+            c.name = std::to_string(n) + " lines: " + c.name;
+            all.push_back(std::move(c));
         }
-        series.push_back(row);
     }
+    const std::vector<xavo::bench::Stats> stats = xavo::bench::Interleaved(o, xavo::bench::Clock::kThreadCpu, all);
+    Series series(sizes.size());
+    for (size_t i = 0; i < stats.size(); ++i) series[i / perSize].push_back(stats[i].median);
     return series;
 }
 
@@ -75,39 +85,46 @@ double Exponent(const std::vector<int> &sizes, const Series &series, size_t c) {
     return xavo::bench::GrowthExponent(x, y);
 }
 
+// Places path's text before each sample of a candidate of its size.
+std::function<void()> Placing(const char *path, std::string text) {
+    return [path, text = std::move(text)] { xavo::test::PlaceFile(path, text); };
+}
+
 std::vector<Candidate> NptabCandidates(int n) {
-    xavo::test::PlaceFile(kNptab, NptabText(n));
+    const auto place = Placing(kNptab, NptabText(n));
     return {
-        {"plain read of the table", [] { PlainRead(kNptab); }},
+        {"plain read of the table", [] { PlainRead(kNptab); }, place},
         {"XAVOPrinterNetNptabEnum",
          [] {
              xavo::SzList list(ORLICSzListAlloc(256));
              Must(XAVOPrinterNetNptabEnum(list.addr()) == 0, "XAVOPrinterNetNptabEnum");
-         }},
-        {"XAVOPrinterEnumCount", [n] { Must(XAVOPrinterEnumCount(XAVO_PRINTER_TYPE_NET, nullptr) == n, "XAVOPrinterEnumCount"); }},
+         },
+         place},
+        {"XAVOPrinterEnumCount", [n] { Must(XAVOPrinterEnumCount(XAVO_PRINTER_TYPE_NET, nullptr) == n, "XAVOPrinterEnumCount"); },
+         place},
     };
 }
 
 std::vector<Candidate> UsbtabCandidates(int n) {
-    xavo::test::PlaceFile(kUsbtab, UsbtabText(n));
+    const auto place = Placing(kUsbtab, UsbtabText(n));
     return {
-        {"plain read of the table", [] { PlainRead(kUsbtab); }},
+        {"plain read of the table", [] { PlainRead(kUsbtab); }, place},
         {"XAVOPrinterUsbtabEnum",
          [n] {
              char **names = nullptr;
              int32_t count = 0;
              Must(XAVOPrinterUsbtabEnum(&names, &count) == 0 && count == n, "XAVOPrinterUsbtabEnum");
              std::free(names);
-         }},
+         },
+         place},
     };
 }
 
 std::vector<Candidate> RemovalCandidates(int n) {
-    const std::string text = NptabText(n);
     auto conf = std::make_shared<NetPrinterConf>();
     std::snprintf(conf->szIP, sizeof conf->szIP, "%s", Ip(n - 1).c_str());
     std::snprintf(conf->szCupsPrinterName, sizeof conf->szCupsPrinterName, "net%d", n - 1);
-    auto restore = [text] { xavo::test::PlaceFile(kNptab, text); };
+    const auto restore = Placing(kNptab, NptabText(n));
     return {
         {"plain read of the table", [] { PlainRead(kNptab); }, restore},
         {"XAVOPrinterNetUpdateConf removing the last line",
