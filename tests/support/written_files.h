@@ -54,7 +54,7 @@ inline std::string_view TrimBlanks(std::string_view s) {
 // writers never make; nor is a comment or a carriage return (a reader that
 // splits lines there would see a line of its own).
 inline void CheckFile(const char *szFile, const Keys &topKeys, const std::map<std::string, const Keys *> &sections,
-               std::vector<std::string> *pFound) {
+                      std::vector<std::string> *pFound) {
     std::set<std::string> names, keys;
     const Keys *pKeys = &topKeys;
     const std::string file = szFile;
