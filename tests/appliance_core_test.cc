@@ -22,6 +22,7 @@
 #include "support/processes.h"
 #include "support/sections.h"
 #include "xavocore.h"
+#include "xavoprinter.h"
 
 using ::testing::IsEmpty;
 using xavo::SzHash;
@@ -83,7 +84,7 @@ TEST(PlatformAtomicWrite, ReplacesTheFileKeepingModeAndOwnerButNeverThroughASyml
         ASSERT_EQ(symlink("/tmp/victim", w.path), 0);
         ORLICErrSetEx(0, "", 0);
         EXPECT_LT(w.write(w.path), 0);
-        EXPECT_EQ(ORLICErrGet(), 0x0900u);
+        EXPECT_EQ(ORLICErrGet(), ERR_OPEN);
         EXPECT_TRUE(S_ISLNK(Stat(w.path).st_mode));
         EXPECT_EQ(ReadFile("/tmp/victim"), kStartText);
         unlink(w.path);
@@ -132,7 +133,7 @@ TEST(PlatformControls, FailsTheChosenCallWithItsFailureValueAndCode) {
     EXPECT_EQ(ORLICSzHashSetValue(first.addr(), "k", "v"), 0);
     EXPECT_STREQ(ORLICSzHashGetValue(first.get(), "k"), "v");
     EXPECT_LT(ORLICFileSetKeyValue(kNptab, "lp0", "1-1", kKvFmt), 0);
-    EXPECT_EQ(ORLICErrGet(), 0x0900u);
+    EXPECT_EQ(ORLICErrGet(), ERR_OPEN);
     EXPECT_FALSE(FileExists(kNptab));
     EXPECT_EQ(ORLICExec("/bin/true", nullptr, nullptr, nullptr, nullptr), -1);
     EXPECT_EQ(XavoStandinCallCount("*"), 3);
@@ -231,7 +232,7 @@ TEST(SectionFile, KeptReadNeverOutlivesTheFile) {
         const int32_t added = ORLICFileAddSection(kConf, "p", Hash({{"k", "9"}}).get(), kFmt);
         if (c.after == nullptr) {
             EXPECT_LT(added, 0) << c.what;
-            EXPECT_EQ(ORLICErrGet(), 0x0900u) << c.what;
+            EXPECT_EQ(ORLICErrGet(), ERR_OPEN) << c.what;
             continue;
         }
         if (added == 0) {

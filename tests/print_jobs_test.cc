@@ -130,7 +130,7 @@ TEST_F(JobWaitListing, AnswersWhetherTheJobIsListed) {
     XavoStandinFailCall("ORLICPopen", 1, 0x0900);
     EXPECT_EQ(XAVOPrinterCupsJobWaitComplete(kPrinter, "5"), -1);
     XavoStandinReset();
-    EXPECT_EQ(ORLICErrGet(), 0x0900u);
+    EXPECT_EQ(ORLICErrGet(), ERR_OPEN);
     EXPECT_THAT(Logs(), ElementsAre(StartsWith("3 printer_cups_job_wait_complete:N open failed. [0x0900 ")));
 }
 
