@@ -14,6 +14,7 @@
 #include <string>
 #include <vector>
 
+#include "internal/guards.h"
 #include "sandbox/cupsd.h"
 #include "support/fault_sweep.h"
 #include "support/logs.h"
@@ -257,10 +258,9 @@ TEST_F(UnusualSerial, IsListedUnderItsSectionsNameAndALongOneGetsItsQueue) {
         Plug("lp0", "1-1", serial);
         ASSERT_EQ(XAVOPrinterEnableExt(1, "lp0", "1-1"), 0) << serial;
         EXPECT_EQ(ReadSection(kConf, id).at("mode"), "usbip") << serial;
-        ORLICSzList *list = nullptr;
-        ASSERT_EQ(XAVOPrinterEnumCount(XAVO_PRINTER_TYPE_USB, &list), 1) << serial;
-        EXPECT_THAT(Items(list), ElementsAre(id));
-        ORLICSzListFree(list);
+        xavo::SzList list;
+        ASSERT_EQ(XAVOPrinterEnumCount(XAVO_PRINTER_TYPE_USB, list.addr()), 1) << serial;
+        EXPECT_THAT(Items(list.get()), ElementsAre(id));
     }
 
     Cupsd::Start();
